@@ -1,0 +1,31 @@
+// SPDX-License-Identifier: Apache-2.0
+#ifndef TSLAUTH_PATHS_H
+#define TSLAUTH_PATHS_H
+
+/// Every fixed path of the system, in one table. They are part of the contract with providers,
+/// installers and administrators, and there is no switch for them.
+namespace tessel::authentication::Paths {
+
+/// The PAM policy that follows the active store; other policies include it.
+inline constexpr char PAMPolicyName[] = "system-auth-generic";
+inline constexpr char PAMPolicy[] = "/etc/pam.d/system-auth-generic";
+inline constexpr char NSSConfiguration[] = "/etc/nsswitch.conf";
+
+inline constexpr char AuthenticationConfiguration[] = "/etc/tessel/tslauth/authentication.conf";
+inline constexpr char ProviderConfiguration[] = "/etc/tessel/tslauth/provider.conf";
+inline constexpr char CAMProviderConfiguration[] = "/etc/tessel/tslauth/camprovider.conf";
+inline constexpr char CAMThumbprintStore[] = "/etc/tessel/tslauth/camservers.conf";
+
+/// A provider's library is this + its name + `ProviderSuffix`.
+inline constexpr char ProviderPrefix[] = "/usr/libexec/tslauth/lib";
+inline constexpr char ProviderSuffix[] = ".so";
+
+/// The module directory that the entries in the PAM policy name; libpam replaces "$ISA".
+inline constexpr char PAMModulePrefix[] = "/lib/security/$ISA/";
+
+/// Held by every `tslauthctl` command that changes the host.
+inline constexpr char ControlLock[] = "/run/lock/tslauthctl.lock";
+
+} // namespace tessel::authentication::Paths
+
+#endif

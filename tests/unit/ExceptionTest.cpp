@@ -1,0 +1,3 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/Exceptions.h>
+#include <gtest/gtest.h>
