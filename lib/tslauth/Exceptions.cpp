@@ -85,10 +85,13 @@ TSLAUTH_PLAIN_EXCEPTION(InvalidIPAddressException)
 TSLAUTH_PLAIN_EXCEPTION(ProviderCallTimedOutException)
 TSLAUTH_PLAIN_EXCEPTION(ThreadErrorException)
 
-TSLAUTH_DETAIL_EXCEPTION(InvalidThumbprintStoreException, "The specified thumbprint store '" + detail + "' is invalid")
-TSLAUTH_DETAIL_EXCEPTION(InvalidVerifyCAMCertificateOptionException, "The VerifyCAMCertificate option is invalid: " + detail)
+TSLAUTH_DETAIL_EXCEPTION(InvalidThumbprintStoreException,
+                         "The specified thumbprint store '" + detail + "' is invalid")
+TSLAUTH_DETAIL_EXCEPTION(InvalidVerifyCAMCertificateOptionException,
+                         "The VerifyCAMCertificate option is invalid: " + detail)
 TSLAUTH_DETAIL_EXCEPTION(InvalidHostNameException, "The current hostname is invalid: " + detail)
-TSLAUTH_DETAIL_EXCEPTION(InvalidCredentialsException, "The credentials that were provided were invalid: " + detail)
+TSLAUTH_DETAIL_EXCEPTION(InvalidCredentialsException,
+                         "The credentials that were provided were invalid: " + detail)
 
 CallNotImplementedException::CallNotImplementedException()
     : Exception(120, "This function is not supported on this system.") {}

@@ -2,8 +2,8 @@
 #ifndef TSLAUTH_PATHS_H
 #define TSLAUTH_PATHS_H
 
-/// Every fixed path of the system, in one table. They are part of the contract with providers,
-/// installers and administrators, and there is no switch for them.
+/// Every fixed path and key of the system, in one table. They are part of the contract with
+/// providers, installers and administrators, and there is no switch for them.
 namespace tessel::authentication::Paths {
 
 /// The PAM policy that follows the active store; other policies include it.
@@ -22,6 +22,11 @@ inline constexpr char ProviderSuffix[] = ".so";
 
 /// The module directory that the entries in the PAM policy name; libpam replaces "$ISA".
 inline constexpr char PAMModulePrefix[] = "/lib/security/$ISA/";
+
+/// The key of `AuthenticationConfiguration` that records the active store's display name.
+inline constexpr char RemoteAuthenticationStoreKey[] = "remote-authentication-store";
+/// The key of `ProviderConfiguration` and `CAMProviderConfiguration` that names the provider.
+inline constexpr char ProviderKey[] = "provider";
 
 /// Held by every `tslauthctl` command that changes the host.
 inline constexpr char ControlLock[] = "/run/lock/tslauthctl.lock";

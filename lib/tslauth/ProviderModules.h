@@ -36,7 +36,8 @@ void Apply(Edit edit, SystemConfiguration::NSSService const& service,
            SystemConfiguration::NSSConfiguration& configuration);
 
 /// The text of a PAM policy file after `edit`.
-/// @throws SystemConfiguration::InvalidFacilityException, InvalidControlException as the reader does
+/// @throws SystemConfiguration::InvalidFacilityException, InvalidControlException as the reader
+/// does
 std::string EditedPAMPolicy(std::string_view text, Edit edit,
                             SystemConfiguration::PAMEntry const& entry);
 

@@ -74,7 +74,8 @@ TSLAUTH_CODED_EXCEPTION(PasswordRestrictionException);
 
 /// @}
 
-/// @name The network or the directory did not answer: repair the connection, the clock or name resolution, then retry.
+/// @name The network or the directory did not answer: repair the connection, the clock or name
+/// resolution, then retry.
 /// @{
 
 /// 1229: "An operation was attempted on a nonexistent network connection."
@@ -122,7 +123,8 @@ TSLAUTH_CODED_EXCEPTION(InvalidWorkgroupNameException);
 
 /// @}
 
-/// @name The host does not stand with its domain as the call expects: join it, part it, or join it anew.
+/// @name The host does not stand with its domain as the call expects: join it, part it, or join it
+/// anew.
 /// @{
 
 /// 1810: "The name or security ID (SID) of the domain specified is inconsistent with ..."

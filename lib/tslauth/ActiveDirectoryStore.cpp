@@ -1,0 +1,284 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/ActiveDirectoryStore.h>
+
+#include "MutexLock.h"
+#include "Paths.h"
+#include "ProviderModules.h"
+#include "SystemFile.h"
+#include "ThrowMappedException.h"
+
+#include <tslauth/AuthenticationConfiguration.h>
+#include <tslauth/Exceptions.h>
+#include <tslauth/ProviderConfiguration.h>
+#include <tslauth/TslauthThreadUtil.h>
+
+#include <boost/bind/bind.hpp>
+#include <boost/make_shared.hpp>
+
+#include <syslog.h>
+#include <utility>
+
+TSLAUTH_AUTO_PTR_BEGIN
+
+namespace tessel::authentication {
+
+namespace {
+
+/// The trust state of a host whose provider finds nothing to read the trusted domains from.
+constexpr int TrustStateFileNotFound = 7;
+
+std::string ConfiguredProvider() {
+    try {
+        ProviderConfiguration const configuration;
+        auto const provider = configuration.find(Paths::ProviderKey);
+        if (provider == configuration.end() || provider->second.empty()) {
+            throw InvalidActiveDirectoryProviderException("(unset)");
+        }
+        return provider->second;
+    } catch (IOError const&) {
+        throw InvalidActiveDirectoryProviderException("(none installed)");
+    }
+}
+
+/// Brings the PAM policy and then the name-service switch into the state that `edit` asks for.
+void EditSystemFiles(ProviderModules::Edit edit, SystemConfiguration::PAMEntry const& entry,
+                     ActiveDirectoryProvider const& provider) {
+    using namespace ProviderModules;
+    ReplaceFile(Paths::PAMPolicy, EditedPAMPolicy(ReadFile(Paths::PAMPolicy), edit, entry));
+    ReplaceFile(Paths::NSSConfiguration,
+                EditedNSSConfiguration(
+                    ReadFile(Paths::NSSConfiguration), edit,
+                    NSSServiceFor(provider.NSSModule(), provider.NSSModuleParameters())));
+}
+
+/// The provider's answer, or `neutral` where it does not offer the call.
+template <typename Answer, typename Call> Answer AnswerOr(Answer neutral, Call call) {
+    try {
+        return call();
+    } catch (CallNotImplementedException const&) {
+        return neutral;
+    }
+}
+
+/// A worker's failure that is none of the library's own: 1359 is ERROR_INTERNAL_ERROR.
+void ReportInternalError(RequestState& state) {
+    try {
+        ThrowMappedException(1359);
+    } catch (Exception const& failure) {
+        state.Done(&failure);
+    }
+}
+
+/// One of the questions that a worker asks. It runs at most once at a time in the process: `active`
+/// says that it runs, and is cleared by the worker when it ends, so that a provider that hangs
+/// keeps every further caller on the cache and never gathers threads.
+template <typename Answer> struct TimedQuestion {
+    bool& active;
+    bool& clearedWhenNotScheduled;
+    void (*worker)(boost::shared_ptr<ActiveDirectoryProvider>, boost::shared_ptr<RequestState>,
+                   boost::shared_ptr<Answer>);
+    char const* timeoutWarning;
+};
+
+/// Whether the caller is the one to start the worker.
+bool Claim(pthread_mutex_t& mutex, bool& active) {
+    MutexLock const lock(mutex);
+    return !std::exchange(active, true);
+}
+
+void Clear(pthread_mutex_t& mutex, bool& active) {
+    MutexLock const lock(mutex);
+    active = false;
+}
+
+template <typename Answer>
+Answer AskTimed(TimedQuestion<Answer> const& question, pthread_mutex_t& mutex, int timeout,
+                boost::shared_ptr<ActiveDirectoryProvider> const& provider,
+                boost::shared_ptr<Answer> const& cache) {
+    if (Claim(mutex, question.active)) {
+        boost::shared_ptr<RequestState> state;
+        try {
+            state = boost::make_shared<RequestState>();
+            TslauthThreadUtil::ScheduleThread(boost::bind(question.worker, provider, state, cache));
+        } catch (ThreadErrorException const&) {
+            Clear(mutex, question.clearedWhenNotScheduled);
+            throw;
+        } catch (...) {
+            Clear(mutex, question.active);
+            throw;
+        }
+        try {
+            state->WaitResult(timeout);
+        } catch (ProviderCallTimedOutException const&) {
+            syslog(LOG_WARNING, "%s", question.timeoutWarning);
+        }
+    }
+    MutexLock const lock(mutex);
+    return *cache;
+}
+
+/// The work of a worker: asks, stores the answer in `cache`, clears `active` and reports the end.
+/// A failure leaves the cache as it was. One of the library's own family reaches the waiter as it
+/// is; any other would end the host's process if it left the thread, and becomes an internal error.
+template <typename Answer, typename Ask>
+void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, Answer& cache,
+                    Answer neutral, Ask ask) {
+    try {
+        Answer answer = AnswerOr(std::move(neutral), ask);
+        {
+            MutexLock const lock(mutex);
+            std::swap(cache, answer);
+            active = false;
+        }
+        state.Done(nullptr);
+    } catch (Exception const& failure) {
+        Clear(mutex, active);
+        state.Done(&failure);
+    } catch (...) {
+        Clear(mutex, active);
+        ReportInternalError(state);
+    }
+}
+
+/// Sets `field` to the provider's answer, or leaves it empty.
+template <typename Field, typename Ask> void Fill(Field& field, Ask ask) {
+    try {
+        field = ask();
+    } catch (...) {
+        // One field that cannot be told must not hide the others.
+    }
+}
+
+} // namespace
+
+pthread_mutex_t ActiveDirectoryStore::_lock = PTHREAD_MUTEX_INITIALIZER;
+bool ActiveDirectoryStore::_isGetStoreConfigThreadActive = false;
+bool ActiveDirectoryStore::_isGetTrustedDomainsThreadActive = false;
+bool ActiveDirectoryStore::_isGetTrustStateThreadActive = false;
+
+ActiveDirectoryStoreConfiguration::~ActiveDirectoryStoreConfiguration() = default;
+
+ActiveDirectoryStore::ActiveDirectoryStore(int timeout)
+    : _timeout(timeout),
+      _provider(boost::make_shared<ActiveDirectoryProvider>(ConfiguredProvider())),
+      _storeConfiguration(boost::make_shared<ActiveDirectoryStoreConfiguration>()),
+      _trustState(boost::make_shared<TrustState>()),
+      _trustedDomains(boost::make_shared<std::deque<Domain>>()) {}
+
+ActiveDirectoryStore::~ActiveDirectoryStore() = default;
+
+std::string ActiveDirectoryStore::GetDisplayName() const {
+    return "Active Directory";
+}
+
+SystemConfiguration::PAMEntry ActiveDirectoryStore::GetPAMEntryForProvider() const {
+    return ProviderModules::PAMEntryFor(_provider->PAMModule(), _provider->PAMModuleParameters());
+}
+
+void ActiveDirectoryStore::MakeActive() {
+    AuthenticationConfiguration configuration;
+    std::string& recorded = configuration[Paths::RemoteAuthenticationStoreKey];
+    EditSystemFiles(ProviderModules::Edit::insert, GetPAMEntryForProvider(), *_provider);
+    recorded = GetDisplayName();
+    configuration.Write();
+}
+
+void ActiveDirectoryStore::MakeInactive() {
+    EditSystemFiles(ProviderModules::Edit::remove, GetPAMEntryForProvider(), *_provider);
+}
+
+std::auto_ptr<StoreConfiguration> ActiveDirectoryStore::GetStoreConfiguration() const {
+    TimedQuestion<ActiveDirectoryStoreConfiguration> const question = {
+        _isGetStoreConfigThreadActive, _isGetStoreConfigThreadActive,
+        &ActiveDirectoryStore::GetStoreConfigurationInt,
+        "GetStoreConfiguration call timedout. Returning cached value."};
+    return std::auto_ptr<StoreConfiguration>(new ActiveDirectoryStoreConfiguration(
+        AskTimed(question, _lock, _timeout, _provider, _storeConfiguration)));
+}
+
+std::deque<Domain> ActiveDirectoryStore::GetTrustedDomains() const {
+    // When its thread cannot be scheduled, the trust-state flag is cleared and this question's own
+    // stays set. Deliberate: a host that ran out of threads once asks no more for its trusted
+    // domains, and keeps what it knows until the process ends.
+    TimedQuestion<std::deque<Domain>> const question = {
+        _isGetTrustedDomainsThreadActive, _isGetTrustStateThreadActive,
+        &ActiveDirectoryStore::GetTrustedDomainsInt,
+        "GetTrustedDomains call timedout. Returning cached value."};
+    return AskTimed(question, _lock, _timeout, _provider, _trustedDomains);
+}
+
+int ActiveDirectoryStore::GetDomainTrustState() const {
+    try {
+        GetTrustedDomains();
+    } catch (FileNotFoundException const&) {
+        MutexLock const lock(_lock);
+        _trustState->value = TrustStateFileNotFound;
+        return TrustStateFileNotFound;
+    } catch (Exception const& failure) {
+        syslog(LOG_WARNING, "GetDomainTrustState: Call to GetTrustedDomains() failed: %s",
+               failure.what());
+    }
+    TimedQuestion<TrustState> const question = {
+        _isGetTrustStateThreadActive, _isGetTrustStateThreadActive,
+        &ActiveDirectoryStore::GetDomainTrustStateInt,
+        "GetDomainTrustState call timedout. Returning cached value."};
+    return AskTimed(question, _lock, _timeout, _provider, _trustState).value;
+}
+
+int ActiveDirectoryStore::GetDomainTrustRelationship(std::string const& domain) const {
+    return AnswerOr(0, [&] { return _provider->GetDomainTrustRelationship(domain); });
+}
+
+std::string ActiveDirectoryStore::GetHostPrincipalForDomain(std::string const& domain) const {
+    return AnswerOr(std::string(), [&] { return _provider->GetHostPrincipalForDomain(domain); });
+}
+
+std::string ActiveDirectoryStore::GetDomainControllerForDomain(std::string const& domain) const {
+    return AnswerOr(std::string(),
+                    [&] { return _provider->GetAnyDomainController(std::string(), domain); });
+}
+
+std::string ActiveDirectoryStore::ConvertCanonicalUsername(std::string const& name) const {
+    return AnswerOr(name, [&] { return _provider->ConvertCanonicalUsername(name); });
+}
+
+void ActiveDirectoryStore::SetPreferredDomainControllers(
+    std::deque<std::string> const& controllers) {
+    try {
+        _provider->SetPreferredDomainControllers(controllers);
+    } catch (CallNotImplementedException const&) {
+        syslog(LOG_WARNING, "Setting of preferred domain controllers is not implemented.");
+    }
+}
+
+void ActiveDirectoryStore::GetStoreConfigurationInt(
+    ProviderPointer provider, StatePointer state,
+    boost::shared_ptr<ActiveDirectoryStoreConfiguration> cache) {
+    ActiveDirectoryStoreConfiguration answer;
+    Fill(answer.activeDomain, [&] { return provider->GetActiveDomain(); });
+    Fill(answer.preferredDomainControllers,
+         [&] { return provider->GetPreferredDomainControllers(); });
+    Fill(answer.machineAccountDN, [&] { return provider->GetMachineAccountDN(); });
+    {
+        MutexLock const lock(_lock);
+        std::swap(*cache, answer);
+        _isGetStoreConfigThreadActive = false;
+    }
+    state->Done(nullptr);
+}
+
+void ActiveDirectoryStore::GetTrustedDomainsInt(ProviderPointer provider, StatePointer state,
+                                                boost::shared_ptr<std::deque<Domain>> cache) {
+    AnswerInWorker(_lock, _isGetTrustedDomainsThreadActive, *state, *cache, std::deque<Domain>(),
+                   [&] { return provider->GetTrustedDomains(); });
+}
+
+void ActiveDirectoryStore::GetDomainTrustStateInt(ProviderPointer provider, StatePointer state,
+                                                  boost::shared_ptr<TrustState> cache) {
+    AnswerInWorker(_lock, _isGetTrustStateThreadActive, *state, *cache, TrustState{0},
+                   [&] { return TrustState{provider->GetDomainTrustState()}; });
+}
+
+} // namespace tessel::authentication
+
+TSLAUTH_AUTO_PTR_END

@@ -1,0 +1,76 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/RequestState.h>
+
+#include "MutexLock.h"
+#include "ThreadError.h"
+
+#include <cerrno>
+#include <limits>
+#include <new>
+#include <sys/time.h>
+
+namespace tessel::authentication {
+
+namespace {
+
+/// Now + `seconds`, held within what the clock can count: time_t has 32 bits in a 32-bit process.
+timespec DeadlineIn(int seconds) {
+    timeval now;
+    gettimeofday(&now, nullptr);
+    timespec deadline;
+    if (__builtin_add_overflow(now.tv_sec, seconds, &deadline.tv_sec)) {
+        deadline.tv_sec = std::numeric_limits<time_t>::max();
+    }
+    if (deadline.tv_sec < 0) {
+        deadline.tv_sec = 0;
+    }
+    deadline.tv_nsec = static_cast<long>(now.tv_usec) * 1000;
+    return deadline;
+}
+
+} // namespace
+
+RequestState::RequestState() : _done(false), _failureLost(false) {
+    pthread_mutex_init(&_mutex, nullptr);
+    pthread_cond_init(&_condition, nullptr);
+}
+
+RequestState::~RequestState() {
+    pthread_mutex_destroy(&_mutex);
+    pthread_cond_destroy(&_condition);
+}
+
+void RequestState::Done(Exception const* failure) noexcept {
+    MutexLock const lock(_mutex);
+    _done = true;
+    if (failure) {
+        try {
+            _failure.reset(failure->Clone());
+        } catch (std::bad_alloc const&) {
+            _failureLost = true;
+        }
+    }
+    pthread_cond_signal(&_condition);
+}
+
+void RequestState::WaitResult(int timeoutSeconds) {
+    timespec const deadline = DeadlineIn(timeoutSeconds);
+    MutexLock const lock(_mutex);
+    while (!_done) {
+        int const error = pthread_cond_timedwait(&_condition, &_mutex, &deadline);
+        if (error == ETIMEDOUT) {
+            throw ProviderCallTimedOutException("Provider call timed out.");
+        }
+        if (error != 0) {
+            ThrowThreadError("pthread_cond_timedwait failed. RC=", error);
+        }
+    }
+    if (_failure) {
+        _failure->Throw();
+    }
+    if (_failureLost) {
+        throw std::bad_alloc();
+    }
+}
+
+} // namespace tessel::authentication

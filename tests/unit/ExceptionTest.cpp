@@ -1,3 +1,0 @@
-// SPDX-License-Identifier: Apache-2.0
-#include <tslauth/Exceptions.h>
-#include <gtest/gtest.h>

@@ -1,0 +1,164 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/Exceptions.h>
+#include <tslauth/RequestState.h>
+#include <tslauth/TslauthThreadUtil.h>
+
+#include <boost/bind/bind.hpp>
+#include <boost/make_shared.hpp>
+#include <boost/shared_ptr.hpp>
+#include <boost/weak_ptr.hpp>
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <chrono>
+#include <deque>
+#include <limits>
+#include <pthread.h>
+#include <string>
+#include <thread>
+
+using namespace tessel::authentication;
+
+namespace {
+
+/// What the next waits answer, first to last; empty lets them through.
+std::deque<int> waitResults;
+int waits = 0;
+
+} // namespace
+
+// The linker sends the library's calls here (see CMakeLists.txt).
+extern "C" {
+int __real_pthread_cond_timedwait(pthread_cond_t*, pthread_mutex_t*, timespec const*);
+int __wrap_pthread_cond_timedwait(pthread_cond_t* condition, pthread_mutex_t* mutex,
+                                  timespec const* deadline);
+
+int __wrap_pthread_cond_timedwait(pthread_cond_t* condition, pthread_mutex_t* mutex,
+                                  timespec const* deadline) {
+    ++waits;
+    if (waitResults.empty()) {
+        return __real_pthread_cond_timedwait(condition, mutex, deadline);
+    }
+    int const result = waitResults.front();
+    waitResults.pop_front();
+    return result;
+}
+}
+
+namespace {
+
+void FinishAfter(boost::shared_ptr<RequestState> const& state, std::chrono::milliseconds delay) {
+    std::this_thread::sleep_for(delay);
+    state->Done(nullptr);
+}
+
+std::string MessageOf(RequestState& state, int timeout) {
+    try {
+        state.WaitResult(timeout);
+    } catch (Exception const& failure) {
+        return failure.what();
+    }
+    return "";
+}
+
+} // namespace
+
+TEST(RequestState, WaitOfZeroSecondsTimesOutAtOnce) {
+    RequestState state;
+    EXPECT_THROW(state.WaitResult(0), ProviderCallTimedOutException);
+    EXPECT_EQ("Provider call timed out.", MessageOf(state, 0));
+}
+
+TEST(RequestState, NegativeTimeoutTimesOutAtOnce) {
+    RequestState state;
+    EXPECT_THROW(state.WaitResult(-1), ProviderCallTimedOutException);
+    EXPECT_THROW(state.WaitResult(std::numeric_limits<int>::min()), ProviderCallTimedOutException);
+}
+
+TEST(RequestState, HugeTimeoutWaitsForTheWorker) {
+    auto const state = boost::make_shared<RequestState>();
+    TslauthThreadUtil::ScheduleThread(
+        boost::bind(&FinishAfter, state, std::chrono::milliseconds(30)));
+    EXPECT_NO_THROW(state->WaitResult(std::numeric_limits<int>::max()));
+}
+
+TEST(RequestState, DoneBeforeTheWaitReturnsAtOnce) {
+    RequestState state;
+    state.Done(nullptr);
+    EXPECT_NO_THROW(state.WaitResult(0));
+    EXPECT_NO_THROW(state.WaitResult(60));
+}
+
+TEST(RequestState, FailureIsThrownAsItsOwnClassEachTime) {
+    RequestState state;
+    {
+        NoSuchDomainException const failure(1355, "gone");
+        state.Done(&failure);
+    }
+    for (int i = 0; i < 2; ++i) {
+        EXPECT_THROW(state.WaitResult(0), NoSuchDomainException);
+        EXPECT_EQ("Exception 0x0000054b: gone", MessageOf(state, 0));
+    }
+}
+
+TEST(RequestState, LaterFailureReplacesTheEarlierOne) {
+    RequestState state;
+    TimeSkewException const first(1398, "first");
+    LogonFailureException const second(1326, "second");
+    state.Done(&first);
+    state.Done(&second);
+    EXPECT_THROW(state.WaitResult(0), LogonFailureException);
+    state.Done(nullptr);
+    EXPECT_THROW(state.WaitResult(0), LogonFailureException);
+}
+
+namespace {
+
+struct CannotBeCopied : Exception {
+    CannotBeCopied() : Exception("x") {}
+    Exception* Clone() const override {
+        throw std::bad_alloc();
+    }
+};
+
+} // namespace
+
+TEST(RequestState, FailureThatCannotBeKeptIsNotTakenForSuccess) {
+    RequestState state;
+    CannotBeCopied const failure;
+    state.Done(&failure);
+    EXPECT_THROW(state.WaitResult(0), std::bad_alloc);
+}
+
+TEST(RequestState, WaiterThatGivesUpLeavesTheWorkerItsState) {
+    auto state = boost::make_shared<RequestState>();
+    boost::weak_ptr<RequestState> const observed = state;
+    TslauthThreadUtil::ScheduleThread(
+        boost::bind(&FinishAfter, state, std::chrono::milliseconds(50)));
+    EXPECT_THROW(state->WaitResult(0), ProviderCallTimedOutException);
+    state.reset();
+    EXPECT_FALSE(observed.expired());
+    for (int i = 0; i < 200 && !observed.expired(); ++i) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+    EXPECT_TRUE(observed.expired());
+}
+
+TEST(RequestState, WaitThatFailsIsReportedWithWhatIsLeftOfItsText) {
+    RequestState state;
+    waitResults = {EINVAL};
+    EXPECT_EQ("Thread Error:  failed. RC=", MessageOf(state, 60));
+    waitResults = {EPERM};
+    EXPECT_THROW(state.WaitResult(60), ThreadErrorException);
+    // The mutex was released: the worker can still finish.
+    state.Done(nullptr);
+    EXPECT_NO_THROW(state.WaitResult(0));
+}
+
+TEST(RequestState, SpuriousWakeUpGoesOnWaiting) {
+    RequestState state;
+    waitResults = {0, 0, ETIMEDOUT};
+    waits = 0;
+    EXPECT_THROW(state.WaitResult(60), ProviderCallTimedOutException);
+    EXPECT_EQ(3, waits);
+}
