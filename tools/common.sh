@@ -1,0 +1,70 @@
+# SPDX-License-Identifier: Apache-2.0
+# Shell code that the programs of this folder share. Sourced, never run.
+
+readonly tree=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
+readonly self=$tree/tools/${0##*/}
+
+if [[ -t 1 && -z ${NO_COLOR-} && ${TERM-dumb} != dumb ]]; then
+    readonly bold=$'\e[1m' red=$'\e[31m' green=$'\e[32m' cyan=$'\e[36m' plain=$'\e[0m'
+else
+    readonly bold='' red='' green='' cyan='' plain=''
+fi
+
+# Starts the program again through sudo where it is not root already.
+become_root() {
+    ((EUID != 0)) || return 0
+    command -v sudo >/dev/null || {
+        echo "${0##*/}: must be run as root (there is no sudo here)" >&2
+        exit 1
+    }
+    exec sudo ${NO_COLOR+NO_COLOR="$NO_COLOR"} ${CI+CI="$CI"} -- "$self" "$@"
+}
+
+# What every program of this folder needs to build the library and to make a node.
+readonly build_packages=(
+    cmake ninja-build g++ pkg-config libboost-dev libssl-dev libcli11-dev nlohmann-json3-dev
+    libc6-dev iproute2 util-linux passwd
+)
+# What shows that the log-in is real: a PAM and a name-service module, and a client of each library.
+readonly login_packages=(
+    libpam-modules libpam-runtime libpam-pwdfile libnss-extrausers libc-bin pamtester openssl
+    diffutils
+)
+
+missing_packages() {
+    local -A installed=()
+    local name
+    while read -r name; do
+        installed[$name]=1
+    done < <(dpkg-query -W -f '${db:Status-Status} ${Package}\n' "$@" 2>/dev/null |
+        sed -n 's/^installed //p')
+    for name in "$@"; do
+        [[ -n ${installed[$name]-} ]] || echo "$name"
+    done
+}
+
+# Installs those of the packages named that are missing; says nothing. The lists of packages are
+# fetched only where the ones at hand do not serve.
+install_packages() {
+    local -a missing apt
+    mapfile -t missing < <(missing_packages "$@")
+    ((${#missing[@]})) || return 0
+    apt=(env DEBIAN_FRONTEND=noninteractive apt-get -y -q -o Dpkg::Use-Pty=0)
+    "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null ||
+        { "${apt[@]}" update </dev/null &&
+            "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null; }
+}
+
+# Every file that decides who may log in and how names are resolved, with mode, owner and sum.
+machine_configuration() {
+    {
+        find /etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf \
+            /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel \
+            -printf '%p %y %m %u %g %l\n' 2>/dev/null
+        find /etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf \
+            /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel \
+            -type f -exec sha256sum {} + 2>/dev/null
+        ls -d /lib/security /usr/libexec/tslauth /run/lock/tslauthctl.lock 2>/dev/null
+        echo "host name $(uname -n)"
+    } | sort
+}
