@@ -1,0 +1,131 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/AtomicFileStream.h>
+
+#include "Assertion.h"
+#include "SystemFile.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <tslauth/Exceptions.h>
+#include <unistd.h>
+
+namespace tessel::authentication {
+
+namespace {
+
+/// The descriptor of an open stream. The standard library knows it and does not tell, but lets
+/// derived classes at the file that holds it. Opening the file a second time instead could miss an
+/// error that the kernel reports once for each opened file.
+int DescriptorOf(std::filebuf& buffer) {
+    struct Access : std::filebuf {
+        static int Number(std::filebuf& any) {
+            return (any.*(&Access::_M_file)).fd();
+        }
+    };
+    return Access::Number(buffer);
+}
+
+/// Makes the entries of the folder that holds `path` durable.
+void SyncDirectoryOf(std::string const& path) {
+    std::string::size_type const slash = path.rfind('/');
+    std::string const directory = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+    int const opened = ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (opened < 0) {
+        return;
+    }
+    // Best effort, here and above: the target is in place and whole, some file systems refuse to
+    // sync a folder, and what a crash could undo is only the rename, back to the old whole file.
+    (void)::fsync(opened);
+    (void)::close(opened);
+}
+
+} // namespace
+
+AtomicFileStream::AtomicFileStream(char const* path, std::ios::openmode mode) {
+    open(path, mode);
+}
+
+AtomicFileStream::~AtomicFileStream() = default;
+
+void AtomicFileStream::open(char const* path, std::ios::openmode mode) {
+    if (!(mode & ~std::ios::in)) {
+        FailAssertion("mode & ~std::ios::in", "lib/tslauth/AtomicFileStream", __LINE__,
+                      "void tessel::authentication::AtomicFileStream::open(const char*, "
+                      "std::ios_base::openmode)");
+    }
+    char name[4096];
+    // A path that does not fit loses its six placeholders, which `mkstemp` then refuses.
+    (void)std::snprintf(name, sizeof name, "%s.XXXXXX", path);
+    int const created = ::mkstemp(name);
+    if (created < 0) {
+        int const error = errno;
+        ThrowIOError("Unable to create temporary file to write '" + std::string(path) + "'", error);
+    }
+    // Nothing was written through this descriptor; the stream opens the file by its name.
+    (void)::close(created);
+    _tempName = name;
+    _targetName = path;
+    if (rdbuf()->open(_tempName, mode | std::ios::out)) {
+        clear();
+    } else {
+        setstate(std::ios::failbit);
+    }
+}
+
+void AtomicFileStream::Sync() {
+    // A stream that failed before writes nothing here, and the error number is still that of the
+    // failure. There is none when the stream's state was set by hand.
+    flush();
+    int error = 0;
+    if (fail()) {
+        error = errno != 0 ? errno : EIO;
+    } else if (!is_open()) {
+        error = EBADF;
+    } else if (::fsync(DescriptorOf(*rdbuf())) != 0) {
+        error = errno;
+        setstate(std::ios::badbit);
+    }
+    if (error != 0) {
+        ThrowIOError("Cannot write '" + _targetName + "'", error);
+    }
+}
+
+void AtomicFileStream::Commit() {
+    if (!rdbuf()->close()) {
+        // Not reported, and the rename goes on: only `Sync` vouches for the contents.
+        setstate(std::ios::failbit);
+    }
+
+    std::string permissionError;
+    struct stat old = {};
+    errno = 0;
+    bool const known = ::stat(_targetName.c_str(), &old) == 0;
+    if (!known && errno != ENOENT) {
+        permissionError = SystemText(errno);
+    }
+    mode_t const mode = old.st_mode & 07777;
+    if (known) {
+        // So that there is no moment at which who could read the old file cannot read the new one.
+        // A failure shows again, and is reported, at the same call after the rename.
+        (void)::chmod(_tempName.c_str(), mode);
+    }
+
+    if (::rename(_tempName.c_str(), _targetName.c_str()) != 0) {
+        int const error = errno;
+        ThrowIOError("Unable to rename '" + _tempName + "' to '" + _targetName + "'", error);
+    }
+    if (known && ::chmod(_targetName.c_str(), mode) != 0) {
+        permissionError = SystemText(errno);
+    }
+    SyncDirectoryOf(_targetName);
+    if (!permissionError.empty()) {
+        throw FilePermissionError(
+            "Failed to save file permissions, file permissions may be incorrect: " +
+            permissionError);
+    }
+}
+
+} // namespace tessel::authentication

@@ -1,0 +1,13 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/CAMProviderConfiguration.h>
+
+#include "Paths.h"
+
+namespace tessel::authentication {
+
+CAMProviderConfiguration::CAMProviderConfiguration()
+    : Configuration(Paths::CAMProviderConfiguration) {}
+
+CAMProviderConfiguration::~CAMProviderConfiguration() = default;
+
+} // namespace tessel::authentication

@@ -1,0 +1,200 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <tslauth/Configuration.h>
+
+#include "SystemFile.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <iterator>
+#include <string_view>
+#include <tslauth/AtomicFileStream.h>
+#include <tslauth/Exceptions.h>
+#include <vector>
+
+namespace tessel::authentication {
+
+namespace {
+
+/// A carriage return is none: a file with CRLF line ends keeps it in its values.
+constexpr std::string_view blanks = " \t";
+
+struct Assignment {
+    std::string_view key;
+    std::string_view value;
+};
+
+bool IsQuote(char character) {
+    return character == '"' || character == '\'';
+}
+
+/// A key or a value without the blanks and the one pair of quotes around it.
+std::string_view CleanField(std::string_view field, int lineNumber) {
+    std::string_view::size_type first = field.find_first_not_of(blanks);
+    if (first == std::string_view::npos) {
+        // Deliberate: files in the field hold values of nothing but blanks, and mean them.
+        return field;
+    }
+    std::string_view::size_type last = field.find_last_not_of(blanks);
+    if (IsQuote(field[first])) {
+        if (first == last) {
+            throw ConfigurationError("Error parsing configuration at line " +
+                                     std::to_string(lineNumber) + ": invalid quoting");
+        }
+        if (field[first] == field[last]) {
+            ++first;
+            --last;
+        }
+    }
+    return field.substr(first, last + 1 - first);
+}
+
+Assignment SplitLine(std::string_view line, int lineNumber) {
+    std::string_view::size_type const delimiter = line.find('=');
+    if (delimiter == std::string_view::npos) {
+        throw ConfigurationError("Error parsing configuration on line " +
+                                 std::to_string(lineNumber) + ": no delimiter found");
+    }
+    // The value first: where both are bad, it is the one that the message is about.
+    std::string_view const value = CleanField(line.substr(delimiter + 1), lineNumber);
+    return {CleanField(line.substr(0, delimiter), lineNumber), value};
+}
+
+/// Calls `take` with each assignment of `text`, in order.
+template <typename Take> void ForEachAssignment(std::string_view text, Take take) {
+    int lineNumber = 0;
+    while (!text.empty()) {
+        std::string_view const line = text.substr(0, text.find('\n'));
+        text.remove_prefix(std::min(line.size() + 1, text.size()));
+        ++lineNumber;
+        if (line.find_first_not_of(blanks) != std::string_view::npos) {
+            take(SplitLine(line, lineNumber));
+        }
+    }
+}
+
+std::string_view::size_type CommonPrefix(std::string_view left, std::string_view right) {
+    return static_cast<std::string_view::size_type>(
+        std::mismatch(left.begin(), left.end(), right.begin(), right.end()).first - left.begin());
+}
+
+/// The first eight bytes of `key` as a number that is ordered like them.
+std::uint64_t Rank(std::string_view key) {
+    std::uint64_t rank = 0;
+    for (std::size_t i = 0; i < sizeof rank; ++i) {
+        rank = rank << 8 | (i < key.size() ? static_cast<unsigned char>(key[i]) : 0U);
+    }
+    return rank;
+}
+
+/// The order in which `assignments` enter the map: by key, and the first of a key before its
+/// others. Sorted by numbers where they tell keys apart, because a large file's keys lie all over
+/// the memory: comparing them in place takes longer than everything else together.
+std::vector<std::size_t> SortedOrder(std::vector<Assignment> const& assignments) {
+    std::string_view shared = assignments.front().key;
+    for (Assignment const& assignment : assignments) {
+        shared = shared.substr(0, CommonPrefix(shared, assignment.key));
+    }
+    struct Place {
+        std::uint64_t rank;
+        std::size_t index;
+    };
+    std::vector<Place> places;
+    places.reserve(assignments.size());
+    for (Assignment const& assignment : assignments) {
+        places.push_back({Rank(assignment.key.substr(shared.size())), places.size()});
+    }
+    std::sort(places.begin(), places.end(), [&](Place const& left, Place const& right) {
+        if (left.rank != right.rank) {
+            return left.rank < right.rank;
+        }
+        int const order = assignments[left.index].key.compare(assignments[right.index].key);
+        return order != 0 ? order < 0 : left.index < right.index;
+    });
+    std::vector<std::size_t> order;
+    order.reserve(places.size());
+    for (Place const& place : places) {
+        order.push_back(place.index);
+    }
+    return order;
+}
+
+/// Adds the assignments whose keys are not there yet, at the cost of one walk through the map.
+void Merge(std::map<std::string, std::string>& map, std::vector<Assignment> const& assignments) {
+    auto next = map.begin();
+    for (std::size_t const index : SortedOrder(assignments)) {
+        Assignment const& assignment = assignments[index];
+        while (next != map.end() && next->first < assignment.key) {
+            ++next;
+        }
+        if (next == map.end() || next->first != assignment.key) {
+            next = map.emplace_hint(next, assignment.key, assignment.value);
+        }
+    }
+}
+
+void ThrowMissing(std::string const& key) {
+    throw InvalidKeyException("The specified key '" + key +
+                              "' was not found in this configuration");
+}
+
+} // namespace
+
+Configuration::Configuration(std::string const& path) : _path(path) {
+    std::string const text = ReadFile(path, "Unable to open", OnReadError::EndQuietly);
+    // `Write` leaves a file in order, and then each key goes to the end of the map. From the first
+    // key that does not, the rest is collected and sorted: a map that grows at random places is
+    // several times slower for a large file.
+    std::vector<Assignment> rest;
+    ForEachAssignment(text, [&](Assignment const& assignment) {
+        if (rest.empty() && (empty() || std::prev(end())->first < assignment.key)) {
+            emplace_hint(end(), assignment.key, assignment.value);
+        } else {
+            rest.push_back(assignment);
+        }
+    });
+    if (!rest.empty()) {
+        Merge(*this, rest);
+    }
+}
+
+Configuration::~Configuration() = default;
+
+void Configuration::Write() const {
+    AtomicFileStream stream(_path.c_str(), std::ios::out);
+    // Each line is flushed, so each is put together first: that makes it one system call, whatever
+    // its length.
+    std::string line;
+    for (auto const& [key, value] : *this) {
+        line.assign(key).append(" = \"").append(value).append("\"\n");
+        stream.write(line.data(), static_cast<std::streamsize>(line.size())).flush();
+        if (!stream) {
+            // At once, while the error number is still that of the failure; `Sync` reports it.
+            break;
+        }
+    }
+    stream.Sync();
+    stream.Commit();
+}
+
+std::string& Configuration::operator[](std::string const& key) {
+    iterator const found = find(key);
+    if (found == end()) {
+        ThrowMissing(key);
+    }
+    return found->second;
+}
+
+std::string const& Configuration::operator[](std::string const& key) const {
+    const_iterator const found = find(key);
+    if (found == end()) {
+        ThrowMissing(key);
+    }
+    return found->second;
+}
+
+std::pair<std::string, std::string> GetKeyValuePair(std::string const& line, int lineNumber) {
+    Assignment const assignment = SplitLine(line, lineNumber);
+    return {std::string(assignment.key), std::string(assignment.value)};
+}
+
+} // namespace tessel::authentication
