@@ -68,3 +68,31 @@ machine_configuration() {
         echo "host name $(uname -n)"
     } | sort
 }
+
+# Runs a command as nobody, without any capability and with an empty /tmp. The source tree is there
+# even where it lies below a folder that only root may enter.
+as_nobody() {
+    unshare --mount --propagation private -- bash -euc '
+        tree=$1
+        shift
+        exec {held}<"$tree"
+        mount -t tmpfs -o mode=1777 tmp /tmp
+        above=
+        while IFS= read -r part; do
+            above+=/$part
+            [[ -d $above ]] || break
+            if (($(stat -c "%#a" "$above") % 2 == 0)); then
+                mount -t tmpfs -o mode=0755 above "$above"
+                break
+            fi
+        done < <(dirname "$tree" | tr / "\n" | sed 1d)
+        if [[ ! -d $tree ]]; then
+            mkdir -p "$tree"
+            mount --no-canonicalize --bind "/proc/self/fd/$held" "$tree"
+        fi
+        exec {held}<&-
+        cd "$tree"
+        exec env HOME=/nonexistent setpriv --reuid 65534 --regid 65534 --clear-groups \
+            --inh-caps=-all --bounding-set=-all --no-new-privs -- "$@"
+    ' as_nobody "$tree" "$@"
+}

@@ -1,0 +1,43 @@
+// SPDX-License-Identifier: Apache-2.0
+#ifndef TSLAUTH_TSLAUTH_H
+#define TSLAUTH_TSLAUTH_H
+
+/// Everything that the library offers. Each header can also be included alone.
+#include "ActiveDirectoryProvider.h"
+#include "ActiveDirectoryStore.h"
+#include "ActiveDirectoryStoreConfiguration.h"
+#include "AtomicFileStream.h"
+#include "AuthenticationConfiguration.h"
+#include "AuthenticationStore.h"
+#include "AuthenticationStoreFactory.h"
+#include "CAM.h"
+#include "CAMProviderConfiguration.h"
+#include "CAMThumbprintStore.h"
+#include "ComputerPrincipalInfo.h"
+#include "Configuration.h"
+#include "Credentials.h"
+#include "DirectoryStore.h"
+#include "Domain.h"
+#include "Exception.h"
+#include "Exceptions.h"
+#include "Export.h"
+#include "NoRemoteAuthenticationStore.h"
+#include "ProviderConfiguration.h"
+#include "RemoteAuthenticationStore.h"
+#include "RequestState.h"
+#include "Singleton.h"
+#include "StoreConfiguration.h"
+#include "TrustState.h"
+#include "TslauthThreadUtil.h"
+#include "string_cast.h"
+#include "systemconfiguration/NSSConfiguration.h"
+#include "systemconfiguration/NSSDatabase.h"
+#include "systemconfiguration/NSSService.h"
+#include "systemconfiguration/PAMControl.h"
+#include "systemconfiguration/PAMEntry.h"
+#include "systemconfiguration/PAMFacility.h"
+#include "systemconfiguration/PAMPolicy.h"
+#include "systemconfiguration/PAMStack.h"
+#include "tslauth_provider.h"
+
+#endif
