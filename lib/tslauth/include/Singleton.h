@@ -4,11 +4,15 @@
 
 #include "Export.h"
 
-#include <cassert>
 #include <cstdlib>
 #include <cxxabi.h>
 #include <string>
 #include <typeinfo>
+
+// <cassert> declares this function only while assertions are on.
+extern "C" void __assert_fail(char const* expression, char const* source, unsigned line,
+                              char const* function) noexcept // NOLINT(bugprone-reserved-identifier)
+    __attribute__((__noreturn__));
 
 namespace tessel {
 namespace authentication {
