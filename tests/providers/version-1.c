@@ -1,0 +1,6 @@
+/* SPDX-License-Identifier: Apache-2.0 */
+/* States version 1 in both records. */
+#include "Records.h"
+
+METADATA(1, "a b");
+OPERATIONS_WITHOUT_ENTRIES(1);
