@@ -113,17 +113,17 @@ public:
     }
 
     bool AtEnd() const {
-        return _in.peek() == std::istream::traits_type::eof();
+        return Next() == Traits::eof();
     }
 
     void SkipSpace() {
-        while (!AtEnd() && IsSpace(std::istream::traits_type::to_char_type(_in.peek()))) {
+        while (!AtEnd() && IsSpace(Traits::to_char_type(Next()))) {
             _in.get();
         }
     }
 
     bool Sees(char character) const {
-        return _in.peek() == std::istream::traits_type::to_int_type(character);
+        return Next() == Traits::to_int_type(character);
     }
 
     std::string_view Word() {
@@ -143,6 +143,14 @@ public:
     }
 
 private:
+    using Traits = std::istream::traits_type;
+
+    /// Looks at the next character. A stream that has met its end is not asked again: that would
+    /// put it into the fail state, and an end where a line may begin is no failure.
+    Traits::int_type Next() const {
+        return _in.good() ? _in.peek() : Traits::eof();
+    }
+
     std::istream& _in;
     std::string _word;
     std::string _line;
