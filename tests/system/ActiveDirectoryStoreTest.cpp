@@ -16,27 +16,28 @@ using SystemConfiguration::InvalidFacilityException;
 
 namespace {
 
-constexpr char Entry[] = "sufficient\t/lib/security/$ISA/pam_words.so\ta b c ";
+constexpr char Entry[] = "sufficient\t/lib/security/$ISA/pam_recording.so\tfirst=1 second ";
 
-constexpr char ActivePolicy[] = "#%PAM-1.0\n"
-                                "\n"
-                                "account\tsufficient\t/lib/security/$ISA/pam_words.so\ta b c \n"
-                                "account\trequired\tpam_unix.so\t\n"
-                                "\n"
-                                "auth\trequired\tpam_env.so\t\n"
-                                "auth\trequired\t/lib/security/$ISA/pam_access.so\t\n"
-                                "auth\tsufficient\t/lib/security/$ISA/pam_words.so\ta b c \n"
-                                "auth\t[success=ok default=bad]\tpam_unix.so\tnullok "
-                                "try_first_pass \n"
-                                "\n"
-                                "password\trequired\tpam_unix.so\t\n"
-                                "\n"
-                                "session\trequired\tpam_unix.so\t\n"
-                                "\n";
+constexpr char ActivePolicy[] =
+    "#%PAM-1.0\n"
+    "\n"
+    "account\tsufficient\t/lib/security/$ISA/pam_recording.so\tfirst=1 second \n"
+    "account\trequired\tpam_unix.so\t\n"
+    "\n"
+    "auth\trequired\tpam_env.so\t\n"
+    "auth\trequired\t/lib/security/$ISA/pam_access.so\t\n"
+    "auth\tsufficient\t/lib/security/$ISA/pam_recording.so\tfirst=1 second \n"
+    "auth\t[success=ok default=bad]\tpam_unix.so\tnullok "
+    "try_first_pass \n"
+    "\n"
+    "password\trequired\tpam_unix.so\t\n"
+    "\n"
+    "session\trequired\tpam_unix.so\t\n"
+    "\n";
 
-constexpr char ActiveSwitch[] = "passwd: words [d e] files\n"
-                                "group: words [d e] files\n"
-                                "shadow: words [d e] files\n"
+constexpr char ActiveSwitch[] = "passwd: recording [third] files\n"
+                                "group: recording [third] files\n"
+                                "shadow: recording [third] files\n"
                                 "hosts: files dns\n";
 
 constexpr char Recorded[] = "remote-authentication-store = \"Active Directory\"\n";
@@ -74,7 +75,7 @@ TEST_F(ActiveDirectoryStoreTest, IsNamedActiveDirectory) {
 // Construction
 
 TEST_F(ActiveDirectoryStoreTest, ProviderThatIsNotChosenIsUnset) {
-    for (char const* text : {"provider = \"\"\n", "provider =\n", "other = \"words\"\n", ""}) {
+    for (char const* text : {"provider = \"\"\n", "provider =\n", "other = \"recording\"\n", ""}) {
         Host::Write(Paths::ProviderConfiguration, text);
         EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException) << text;
         EXPECT_EQ("The specified Active Directory provider '(unset)' is invalid",
@@ -91,7 +92,7 @@ TEST_F(ActiveDirectoryStoreTest, MissingProviderConfigurationMeansNoneInstalled)
 }
 
 TEST_F(ActiveDirectoryStoreTest, MalformedProviderConfigurationIsAConfigurationError) {
-    Host::Write(Paths::ProviderConfiguration, "provider = \"\nwords");
+    Host::Write(Paths::ProviderConfiguration, "provider = \"\nrecording");
     EXPECT_THROW(ActiveDirectoryStore(60), ConfigurationError);
     EXPECT_EQ("Error parsing configuration at line 1: invalid quoting", ConstructionFailure());
 }
@@ -186,8 +187,8 @@ TEST_F(ActiveDirectoryStoreTest, EqualEntryAnywhereInTheStackIsNotAddedAgain) {
 
 TEST_F(ActiveDirectoryStoreTest, EntryWithOtherParametersIsAnotherEntry) {
     std::string const policy = PolicyAfterActivationOf(
-        "auth sufficient /lib/security/$ISA/pam_words.so a b\n"
-        "account required /lib/security/$ISA/pam_words.so a b c\n");
+        "auth sufficient /lib/security/$ISA/pam_recording.so first=1\n"
+        "account required /lib/security/$ISA/pam_recording.so first=1 second\n");
     EXPECT_NE(std::string::npos, policy.find(std::string("auth\t") + Entry + "\nauth\t"));
     EXPECT_NE(std::string::npos, policy.find(std::string("account\t") + Entry + "\naccount\t"));
 }
@@ -202,7 +203,8 @@ TEST_F(ActiveDirectoryStoreTest, EmptyPolicyGetsTheEntriesAlone) {
 TEST_F(ActiveDirectoryStoreTest, MissingDatabaseGetsTheServiceAlone) {
     Host::Write(Paths::NSSConfiguration, "hosts: files\ngroup: files\n");
     Activate();
-    EXPECT_EQ("passwd: words [d e]\ngroup: words [d e] files\nshadow: words [d e]\nhosts: files\n",
+    EXPECT_EQ("passwd: recording [third]\ngroup: recording [third] files\nshadow: recording "
+              "[third]\nhosts: files\n",
               Host::Read(Paths::NSSConfiguration));
 }
 
@@ -230,7 +232,7 @@ TEST_F(ActiveDirectoryStoreTest, DeactivationTakesTheEntriesOutAndLeavesTheRecor
     Activate();
     Deactivate();
     std::string policy = Host::Read(Paths::PAMPolicy);
-    EXPECT_EQ(std::string::npos, policy.find("words"));
+    EXPECT_EQ(std::string::npos, policy.find("recording"));
     EXPECT_EQ("passwd: files\ngroup: files\nshadow: files\nhosts: files dns\n",
               Host::Read(Paths::NSSConfiguration));
     EXPECT_EQ(Recorded, Host::Read(Paths::AuthenticationConfiguration));
@@ -248,12 +250,12 @@ TEST_F(ActiveDirectoryStoreTest, DeactivationRemovesTheFirstOfTwoEqualEntriesAlo
     std::string const twice = std::string("auth\t") + Entry + "\nauth\trequired\tpam_unix.so\t\n" +
                               "auth\t" + Entry + "\naccount\t" + Entry + "\n";
     Host::Write(Paths::PAMPolicy, twice);
-    Host::Write(Paths::NSSConfiguration, "passwd: files words\npasswd: words [d e]\n"
-                                         "passwd: sss\npasswd: words [d e]\n");
+    Host::Write(Paths::NSSConfiguration, "passwd: files recording\npasswd: recording [third]\n"
+                                         "passwd: sss\npasswd: recording [third]\n");
     Deactivate();
     EXPECT_EQ(std::string("#%PAM-1.0\n\n\nauth\trequired\tpam_unix.so\t\nauth\t") + Entry + "\n\n",
               Host::Read(Paths::PAMPolicy));
-    EXPECT_EQ("passwd: files words sss words [d e]\n",
+    EXPECT_EQ("passwd: files recording sss recording [third]\n",
               Host::Read(Paths::NSSConfiguration));
     Deactivate();
     EXPECT_EQ("#%PAM-1.0\n\n\nauth\trequired\tpam_unix.so\t\n\n", Host::Read(Paths::PAMPolicy));
@@ -303,7 +305,10 @@ TEST_F(ActiveDirectoryStoreTest, PolicyThatTheModelRefusesStaysAsItIs) {
         {"auth Required pam_unix.so\n", "Invalid Control: Required"},
         {"auth required pam_unix.so \\\n  nullok\n", "Invalid Facility: nullok"},
         {"auth", "Invalid Control: "},
-        {"\x7f" "ELF\x01", "Invalid Facility: \x7f" "ELF\x01"},
+        {"\x7f"
+         "ELF\x01",
+         "Invalid Facility: \x7f"
+         "ELF\x01"},
     };
     for (auto const& refused : cases) {
         Host::Write(Paths::PAMPolicy, std::string("auth required pam_unix.so\n") + refused.text);
@@ -358,8 +363,9 @@ TEST_F(ActiveDirectoryStoreTest, HugeFilesAreCarriedWhole) {
     Host::Write(Paths::NSSConfiguration, "netgroup:" + services + "\n");
     Activate();
     EXPECT_TRUE(Host::Read(Paths::NSSConfiguration) ==
-                "passwd: words [d e]\ngroup: words [d e]\nshadow: words [d e]\nnetgroup:" + services +
-                    "\n");
+                "passwd: recording [third]\ngroup: recording [third]\nshadow: recording "
+                "[third]\nnetgroup:" +
+                    services + "\n");
 }
 
 TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
@@ -373,7 +379,8 @@ TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
 TEST_F(ActiveDirectoryStoreTest, FolderThatCannotBeWrittenLeavesThePolicyAsItWas) {
     std::string const folder = "/etc/pam.d";
     Mount(folder.c_str(), folder, nullptr, MS_BIND, nullptr);
-    ASSERT_EQ(0, mount(nullptr, folder.c_str(), nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr));
+    ASSERT_EQ(0,
+              mount(nullptr, folder.c_str(), nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr));
     auto const before = Host::Snapshot();
     EXPECT_EQ("Unable to create temporary file to write '/etc/pam.d/system-auth-generic': "
               "Read-only file system",
@@ -402,8 +409,7 @@ TEST_F(ActiveDirectoryStoreTest, FileThatCannotBeMovedIntoPlaceLeavesTheOldOne) 
     Mount(Paths::NSSConfiguration, Paths::NSSConfiguration, nullptr, MS_BIND, nullptr);
     std::string const failure = ActivationFailure();
     EXPECT_EQ(0U, failure.find("Unable to rename '/etc/nsswitch.conf.")) << failure;
-    EXPECT_NE(std::string::npos,
-              failure.find("' to '/etc/nsswitch.conf': Device or resource busy"))
+    EXPECT_NE(std::string::npos, failure.find("' to '/etc/nsswitch.conf': Device or resource busy"))
         << failure;
     EXPECT_EQ(Host::Switch, Host::Read(Paths::NSSConfiguration));
     EXPECT_EQ("remote-authentication-store = \"None\"\n",

@@ -125,7 +125,8 @@ TEST_F(NoRemoteAuthenticationStoreTest, ActivatingItAgainTouchesNothing) {
     _none.MakeActive();
     EXPECT_EQ(before, Host::Snapshot());
     EXPECT_EQ(status.st_ino, Host::Status(Paths::AuthenticationConfiguration).st_ino);
-    EXPECT_EQ(status.st_mtim.tv_nsec, Host::Status(Paths::AuthenticationConfiguration).st_mtim.tv_nsec);
+    EXPECT_EQ(status.st_mtim.tv_nsec,
+              Host::Status(Paths::AuthenticationConfiguration).st_mtim.tv_nsec);
     EXPECT_EQ(0, CountedStore::made);
 }
 
@@ -150,11 +151,11 @@ TEST_F(NoRemoteAuthenticationStoreTest, KeepsOtherKeysInByteOrder) {
 TEST_F(NoRemoteAuthenticationStoreTest, WithdrawsActiveDirectory) {
     auto const before = Host::Read(Paths::PAMPolicy);
     _factory.CreateInstance("Active Directory")->MakeActive();
-    EXPECT_NE(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_words.so"));
+    EXPECT_NE(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_recording.so"));
     _none.MakeActive();
     EXPECT_EQ(None, Recorded());
-    EXPECT_EQ(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_words.so"));
-    EXPECT_EQ(std::string::npos, Host::Read(Paths::NSSConfiguration).find("words"));
+    EXPECT_EQ(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_recording.so"));
+    EXPECT_EQ(std::string::npos, Host::Read(Paths::NSSConfiguration).find("recording"));
 }
 
 TEST_F(NoRemoteAuthenticationStoreTest, UnknownStoreIsReportedOnceAndNoneStaysRecorded) {
@@ -218,7 +219,8 @@ TEST_F(NoRemoteAuthenticationStoreTest, FileThatCannotBeWrittenStaysAsItWas) {
     Record("Counted");
     std::string const folder = "/etc/tessel/tslauth";
     Mount(folder.c_str(), folder, nullptr, MS_BIND, nullptr);
-    ASSERT_EQ(0, mount(nullptr, folder.c_str(), nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr));
+    ASSERT_EQ(0,
+              mount(nullptr, folder.c_str(), nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr));
     EXPECT_THROW(_none.MakeActive(), IOError);
     EXPECT_EQ("remote-authentication-store = \"Counted\"\n", Recorded());
     EXPECT_EQ(0, CountedStore::made);
