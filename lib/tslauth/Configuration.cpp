@@ -5,7 +5,7 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <iterator>
+#include <fstream>
 #include <string_view>
 #include <tslauth/AtomicFileStream.h>
 #include <tslauth/Exceptions.h>
@@ -16,7 +16,9 @@ namespace tessel::authentication {
 namespace {
 
 /// A carriage return is none: a file with CRLF line ends keeps it in its values.
-constexpr std::string_view blanks = " \t";
+bool IsBlank(char character) {
+    return character == ' ' || character == '\t';
+}
 
 struct Assignment {
     std::string_view key;
@@ -29,23 +31,25 @@ bool IsQuote(char character) {
 
 /// A key or a value without the blanks and the one pair of quotes around it.
 std::string_view CleanField(std::string_view field, int lineNumber) {
-    std::string_view::size_type first = field.find_first_not_of(blanks);
-    if (first == std::string_view::npos) {
+    std::string_view text = field;
+    while (!text.empty() && IsBlank(text.front())) {
+        text.remove_prefix(1);
+    }
+    if (text.empty()) {
         // Deliberate: files in the field hold values of nothing but blanks, and mean them.
         return field;
     }
-    std::string_view::size_type last = field.find_last_not_of(blanks);
-    if (IsQuote(field[first])) {
-        if (first == last) {
-            throw ConfigurationError("Error parsing configuration at line " +
-                                     std::to_string(lineNumber) + ": invalid quoting");
-        }
-        if (field[first] == field[last]) {
-            ++first;
-            --last;
-        }
+    while (IsBlank(text.back())) {
+        text.remove_suffix(1);
     }
-    return field.substr(first, last + 1 - first);
+    if (!IsQuote(text.front())) {
+        return text;
+    }
+    if (text.size() == 1) {
+        throw ConfigurationError("Error parsing configuration at line " +
+                                 std::to_string(lineNumber) + ": invalid quoting");
+    }
+    return text.front() == text.back() ? text.substr(1, text.size() - 2) : text;
 }
 
 Assignment SplitLine(std::string_view line, int lineNumber) {
@@ -66,7 +70,7 @@ template <typename Take> void ForEachAssignment(std::string_view text, Take take
         std::string_view const line = text.substr(0, text.find('\n'));
         text.remove_prefix(std::min(line.size() + 1, text.size()));
         ++lineNumber;
-        if (line.find_first_not_of(blanks) != std::string_view::npos) {
+        if (!std::all_of(line.begin(), line.end(), IsBlank)) {
             take(SplitLine(line, lineNumber));
         }
     }
@@ -120,9 +124,17 @@ std::vector<std::size_t> SortedOrder(std::vector<Assignment> const& assignments)
 
 /// Adds the assignments whose keys are not there yet, at the cost of one walk through the map.
 void Merge(std::map<std::string, std::string>& map, std::vector<Assignment> const& assignments) {
+    std::vector<std::size_t> const order = SortedOrder(assignments);
+    // The next ones are asked for while one is added: they lie all over a large file's memory, and
+    // waiting for each would take longer than everything else together.
+    static constexpr std::size_t ahead = 16;
     auto next = map.begin();
-    for (std::size_t const index : SortedOrder(assignments)) {
-        Assignment const& assignment = assignments[index];
+    for (std::size_t i = 0; i < order.size(); ++i) {
+        if (i + 2 * ahead < order.size()) {
+            __builtin_prefetch(&assignments[order[i + 2 * ahead]]);
+            __builtin_prefetch(assignments[order[i + ahead]].key.data());
+        }
+        Assignment const& assignment = assignments[order[i]];
         while (next != map.end() && next->first < assignment.key) {
             ++next;
         }
@@ -145,9 +157,11 @@ Configuration::Configuration(std::string const& path) : _path(path) {
     // key that does not, the rest is collected and sorted: a map that grows at random places is
     // several times slower for a large file.
     std::vector<Assignment> rest;
+    std::string_view last;
     ForEachAssignment(text, [&](Assignment const& assignment) {
-        if (rest.empty() && (empty() || std::prev(end())->first < assignment.key)) {
+        if (rest.empty() && (last < assignment.key || empty())) {
             emplace_hint(end(), assignment.key, assignment.value);
+            last = assignment.key;
         } else {
             rest.push_back(assignment);
         }
@@ -166,8 +180,9 @@ void Configuration::Write() const {
     std::string line;
     for (auto const& [key, value] : *this) {
         line.assign(key).append(" = \"").append(value).append("\"\n");
-        stream.write(line.data(), static_cast<std::streamsize>(line.size())).flush();
-        if (!stream) {
+        auto const size = static_cast<std::streamsize>(line.size());
+        if (stream.rdbuf()->sputn(line.data(), size) != size || stream.rdbuf()->pubsync() != 0) {
+            stream.setstate(std::ios::badbit);
             // At once, while the error number is still that of the failure; `Sync` reports it.
             break;
         }
