@@ -2,6 +2,7 @@
 #include <tslauth/Domain.h>
 
 #include <ostream>
+#include <string_view>
 #include <utility>
 
 namespace tessel::authentication {
@@ -27,7 +28,7 @@ bool operator!=(Domain const& left, Domain const& right) noexcept {
 
 std::ostream& operator<<(std::ostream& stream, Domain const& domain) {
     auto const shown = [](std::string const& name) {
-        return name.empty() ? "(unset)" : name.c_str();
+        return name.empty() ? std::string_view("(unset)") : std::string_view(name);
     };
     return stream << "DNS Name: " << shown(domain.DNSName())
                   << ", NetBIOS Name: " << shown(domain.NetBIOSName());
