@@ -1,0 +1,77 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Host.h"
+
+#include <tslauth/ActiveDirectoryProvider.h>
+#include <tslauth/AuthenticationConfiguration.h>
+#include <tslauth/Exceptions.h>
+#include <tslauth/ProviderConfiguration.h>
+
+#include <Paths.h>
+#include <SystemFile.h>
+
+#include <algorithm>
+
+namespace tessel::tslauthctl {
+
+using namespace authentication;
+
+AuthenticationStoreFactory& Stores() {
+    static AuthenticationStoreFactory factory;
+    return factory;
+}
+
+void RequireStore(std::string const& name) {
+    auto const known = Stores().GetRegisteredStores();
+    if (std::find(known.begin(), known.end(), name) != known.end()) {
+        return;
+    }
+    std::string message = "Unknown store '" + name + "'. Known are: ";
+    for (auto const& store : known) {
+        message += (&store == &known.front() ? "'" : ", '") + store + "'";
+    }
+    throw Failure(ExitCode::usage, message);
+}
+
+std::string RecordedStore() {
+    AuthenticationConfiguration const configuration;
+    return configuration[Paths::RemoteAuthenticationStoreKey];
+}
+
+std::string ConfiguredProvider() {
+    try {
+        ProviderConfiguration const configuration;
+        auto const found = configuration.find(Paths::ProviderKey);
+        return found == configuration.end() ? std::string() : found->second;
+    } catch (Exception const&) {
+        // Loading the provider tells why.
+        return {};
+    }
+}
+
+ProviderEntries LoadProvider() {
+    // The store's constructor first, for its exceptions.
+    (void)Stores().CreateInstance(ActiveDirectory);
+    ActiveDirectoryProvider const provider(ConfiguredProvider());
+    using namespace ProviderModules;
+    return {PAMEntryFor(provider.PAMModule(), provider.PAMModuleParameters()),
+            NSSServiceFor(provider.NSSModule(), provider.NSSModuleParameters())};
+}
+
+std::optional<std::string> ReadPolicy(std::string const& name) {
+    std::string const folders[] = {"/etc/pam.d/", "/usr/lib/pam.d/"};
+    for (auto const& folder : folders) {
+        auto const path = !name.empty() && name.front() == '/' ? name : folder + name;
+        try {
+            return ReadFile(path);
+        } catch (IOError const&) {
+            // The next folder may have it.
+        }
+    }
+    return std::nullopt;
+}
+
+Failure Refused(std::exception const& exception) {
+    return {ExitCode::refused, exception.what(), ClassName(exception)};
+}
+
+} // namespace tessel::tslauthctl

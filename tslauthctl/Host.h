@@ -1,0 +1,45 @@
+// SPDX-License-Identifier: Apache-2.0
+#ifndef TSLAUTHCTL_HOST_H
+#define TSLAUTHCTL_HOST_H
+
+#include "Loss.h"
+#include "Output.h"
+
+#include <tslauth/AuthenticationStoreFactory.h>
+
+#include <optional>
+#include <string>
+
+/// What is read from the host; nothing is written here.
+namespace tessel::tslauthctl {
+
+/// The store names of the library, as the tool has to know them apart.
+inline constexpr char NoStore[] = "None";
+inline constexpr char ActiveDirectory[] = "Active Directory";
+
+/// The process's one factory, made on the first call.
+authentication::AuthenticationStoreFactory& Stores();
+
+/// @throws Failure (usage) with the known names, where `name` is none of them
+void RequireStore(std::string const& name);
+
+/// The name of the recorded store.
+/// @throws IOError, ConfigurationError, InvalidKeyException
+std::string RecordedStore();
+
+/// The name of the configured provider; empty where none is configured.
+std::string ConfiguredProvider();
+
+/// Loads the configured provider, through the same checks as the store, and asks what it brings.
+/// @throws what the store's constructor throws
+ProviderEntries LoadProvider();
+
+/// The text of a policy by the name that an include gives; nothing where it cannot be read.
+std::optional<std::string> ReadPolicy(std::string const& name);
+
+/// The library's refusal, as a failure of the command.
+Failure Refused(std::exception const& exception);
+
+} // namespace tessel::tslauthctl
+
+#endif

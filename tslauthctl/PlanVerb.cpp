@@ -1,0 +1,69 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Host.h"
+#include "Plan.h"
+#include "Text.h"
+#include "UnifiedDiff.h"
+#include "Verbs.h"
+
+namespace tessel::tslauthctl {
+
+void DescribePlan(Plan const& plan, Output& output) {
+    auto& document = output.Document();
+    document["store"] = plan.store;
+    document["recorded"] = nullptr;
+    if (!plan.recorded.empty() || !plan.refusal) {
+        document["recorded"] = plan.recorded;
+    }
+    auto& files = document["files"] = nlohmann::json::array();
+    for (auto const& file : plan.files) {
+        auto const diff = UnifiedDiff(file.path, file.before, file.after);
+        files.push_back({{"path", file.path},
+                         {"changed", file.before != file.after},
+                         {"diff", diff},
+                         {"losses", file.losses},
+                         {"notes", file.notes}});
+        output.Diff(diff);
+    }
+    for (auto const& file : plan.files) {
+        for (auto const& loss : file.losses) {
+            output.Warning(file.path + ": " + loss);
+        }
+        for (auto const& note : file.notes) {
+            output.Note(file.path + ": " + note);
+        }
+    }
+    document["refusal"] = nullptr;
+    if (plan.refusal) {
+        document["refusal"] = {{"message", plan.refusal->message},
+                               {"exception", plan.refusal->exceptionClass},
+                               {"afterwards", plan.refusedAfterwards}};
+    }
+}
+
+ExitCode RunPlan(std::string const& store, Output& output) {
+    RequireStore(store);
+    auto const plan = MakePlan(store);
+    DescribePlan(plan, output);
+    if (plan.refusal) {
+        output.Error(
+            Failure(ExitCode::refused, plan.refusal->message, plan.refusal->exceptionClass));
+        output.ErrorDetail(plan.refusedAfterwards
+                               ? "the library would write the above first, and then refuse"
+                               : "the library would refuse; nothing would be changed");
+        output.ErrorDetail("'tslauthctl prepare' shows what keeps it from reading a file");
+        return ExitCode::refused;
+    }
+    if (plan.Loses()) {
+        output.Warning("Activating '" + store +
+                       "' would lose the above; it is refused without "
+                       "--accept-loss. See 'tslauthctl prepare'.");
+        return ExitCode::loss;
+    }
+    if (!plan.Changes()) {
+        output.Line("Activating '" + store + "' would change nothing.");
+        return ExitCode::done;
+    }
+    return ExitCode::changes;
+}
+
+} // namespace tessel::tslauthctl
