@@ -274,6 +274,7 @@ TEST_F(ActiveDirectoryProviderTest, EveryTestProviderIsKnownHere) {
                   "libnot-a-library.so",
                   "libnull-entries.so",
                   "libnull-free-function.so",
+                  "libnull-symbol.so",
                   "libold-metadata.so",
                   "libold-operations.so",
                   "librecording.so",
@@ -356,6 +357,11 @@ TEST_F(ActiveDirectoryProviderTest, AProviderWithoutOperationsIsInvalidAndUnload
                                           ": undefined symbol: ActiveDirectoryClientOperations"),
         LoadingOf("missing-operations"));
     EXPECT_FALSE(IsLoaded("missing-operations"));
+}
+
+TEST_F(ActiveDirectoryProviderTest, ASymbolWithoutAnAddressIsMissingToo) {
+    EXPECT_EQ(Invalid("null-symbol", "the symbol has no address"), LoadingOf("null-symbol"));
+    EXPECT_FALSE(IsLoaded("null-symbol"));
 }
 
 TEST_F(ActiveDirectoryProviderTest, AProviderThatIsTooNewIsInvalidAndUnloaded) {
