@@ -1,15 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/ActiveDirectoryProvider.h>
 
-#include "Paths.h"
+#include "ProviderLibrary.h"
 #include "ThrowMappedException.h"
 
-#include <tslauth/Exceptions.h>
 #include <tslauth/string_cast.h>
 #include <tslauth/tslauth_provider.h>
 
 #include <cstddef>
-#include <dlfcn.h>
 #include <locale>
 #include <sstream>
 #include <type_traits>
@@ -31,25 +29,8 @@ ActiveDirectoryClientCredentials const* RecordOf(Credentials const& credentials)
     return reinterpret_cast<ActiveDirectoryClientCredentials const*>(&credentials);
 }
 
-/// An empty optional argument is passed as null.
-char const* OptionalText(std::string const& text) {
-    return text.empty() ? nullptr : text.c_str();
-}
-
 std::string TextOrEmpty(char const* text) {
     return text == nullptr ? std::string() : std::string(text);
-}
-
-/// What the loader says about its last failure. It forgets it with the call, and with the next call
-/// to it, so this is taken before anything else is done. A symbol whose address is null is missing
-/// too, but no failure for the loader.
-std::string LoaderError() {
-    char const* const text = dlerror();
-    return text == nullptr ? std::string("the symbol has no address") : std::string(text);
-}
-
-template <typename Record> Record const* FindRecord(void* library, char const* symbol) {
-    return static_cast<Record const*>(dlsym(library, symbol));
 }
 
 /// The words of `text`, which may be null.
@@ -63,14 +44,6 @@ std::list<std::string> Words(char const* text) {
         }
     }
     return words;
-}
-
-/// `entry`, unless it is null.
-template <typename Entry> Entry Implemented(Entry entry) {
-    if (entry == nullptr) {
-        throw CallNotImplementedException();
-    }
-    return entry;
 }
 
 /// `entry` of `operations`, a member that came with version 2: whatever an older record holds there
@@ -141,24 +114,12 @@ std::deque<Result> ArrayFrom(int (*entry)(Element***, ActiveDirectoryClientFreeF
 
 } // namespace
 
-void ActiveDirectoryProvider::LibraryCloser::operator()(void* library) const noexcept {
-    // The result is ignored: nobody could do anything about a library that stays.
-    (void)dlclose(library);
-}
-
 ActiveDirectoryProvider::ActiveDirectoryProvider(std::string const& name)
-    : _metadata(nullptr), _operations(nullptr) {
-    std::string const path = Paths::ProviderPrefix + name + Paths::ProviderSuffix;
-    // An error that somebody else has left behind must not pass for this library's.
-    (void)dlerror();
-    _library.reset(dlopen(path.c_str(), RTLD_LAZY));
-    if (_library == nullptr) {
-        throw IOError("Unable to open provider: " + LoaderError());
-    }
-
+    : _library(LoadProvider(name, RTLD_LAZY, "Unable to open provider: ")), _metadata(nullptr),
+      _operations(nullptr) {
     // Every throw from here on closes the library again: its owner is complete.
-    _metadata = FindRecord<ActiveDirectoryClientMetadataRecord>(_library.get(),
-                                                                "ActiveDirectoryClientMetadata");
+    _metadata =
+        FindRecord<ActiveDirectoryClientMetadataRecord>(_library, "ActiveDirectoryClientMetadata");
     if (_metadata == nullptr) {
         throw InvalidActiveDirectoryProviderException(name, LoaderError());
     }
@@ -168,7 +129,7 @@ ActiveDirectoryProvider::ActiveDirectoryProvider(std::string const& name)
                       ") is not supported by this version of libtslauth");
     }
     _operations = FindRecord<ActiveDirectoryClientOperationsRecord>(
-        _library.get(), "ActiveDirectoryClientOperations");
+        _library, "ActiveDirectoryClientOperations");
     if (_operations == nullptr) {
         throw InvalidActiveDirectoryProviderException(name, LoaderError());
     }

@@ -6,10 +6,10 @@
 #include "Credentials.h"
 #include "Domain.h"
 #include "Export.h"
+#include "LibraryHandle.h"
 
 #include <deque>
 #include <list>
-#include <memory>
 #include <string>
 
 struct ActiveDirectoryClientMetadataRecord;
@@ -109,13 +109,9 @@ public:
     int GetDomainTrustRelationship(std::string const& domain) const;
 
 private:
-    struct LibraryCloser {
-        void operator()(void* library) const noexcept;
-    };
-
     void CacheMetadata();
 
-    std::unique_ptr<void, LibraryCloser> _library;
+    LibraryHandle _library;
     ActiveDirectoryClientMetadataRecord const* _metadata;
     ActiveDirectoryClientOperationsRecord const* _operations;
     std::string _pamModule;

@@ -12,6 +12,7 @@
 #include "AuthenticationStoreFactory.h"
 #include "CAM.h"
 #include "CAMProviderConfiguration.h"
+#include "CAMProxy.h"
 #include "CAMThumbprintStore.h"
 #include "ComputerPrincipalInfo.h"
 #include "Configuration.h"
@@ -21,6 +22,7 @@
 #include "Exception.h"
 #include "Exceptions.h"
 #include "Export.h"
+#include "LibraryHandle.h"
 #include "NoRemoteAuthenticationStore.h"
 #include "ProviderConfiguration.h"
 #include "RemoteAuthenticationStore.h"
@@ -38,6 +40,7 @@
 #include "systemconfiguration/PAMFacility.h"
 #include "systemconfiguration/PAMPolicy.h"
 #include "systemconfiguration/PAMStack.h"
+#include "tslauth_cam_provider.h"
 #include "tslauth_provider.h"
 
 #endif
