@@ -13,24 +13,21 @@ namespace tessel::authentication {
 
 namespace {
 
-/// One row: a code, what it throws, and the text that follows the prefix of the message; null where
-/// the class fixes its text itself.
-struct MappedException {
-    ActiveDirectoryClientErrorCode code;
-    void (*raise)(MappedException const& row);
-    char const* text;
-};
-
-template <typename Class> [[noreturn]] void Throw(MappedException const& row) {
-    throw Class(row.code, row.text);
+template <typename Class>
+[[noreturn]] void Throw(ActiveDirectoryClientErrorCode code, char const* text) {
+    throw Class(code, text);
 }
 
-template <> [[noreturn]] void Throw<CallNotImplementedException>(MappedException const& /*row*/) {
+template <>
+[[noreturn]] void Throw<CallNotImplementedException>(ActiveDirectoryClientErrorCode /*code*/,
+                                                     char const* /*text*/) {
     throw CallNotImplementedException();
 }
 
-template <> [[noreturn]] void Throw<UnknownException>(MappedException const& row) {
-    throw UnknownException(row.code);
+template <>
+[[noreturn]] void Throw<UnknownException>(ActiveDirectoryClientErrorCode code,
+                                          char const* /*text*/) {
+    throw UnknownException(code);
 }
 
 /// The table, in order of code.
@@ -135,6 +132,9 @@ constexpr MappedException mappedExceptions[] = {
     {0xffff0001U, &Throw<UnknownException>, nullptr},
 };
 
+/// What every other code throws.
+constexpr MappedException unknownException = {0, &Throw<UnknownException>, nullptr};
+
 constexpr bool InOrderOfCode() {
     for (std::size_t row = 1; row < std::size(mappedExceptions); ++row) {
         if (mappedExceptions[row - 1].code >= mappedExceptions[row].code) {
@@ -148,7 +148,7 @@ static_assert(std::size(mappedExceptions) == 48);
 
 } // namespace
 
-void ThrowMappedException(ActiveDirectoryClientErrorCode code) {
+MappedException const& FindMappedException(ActiveDirectoryClientErrorCode code) {
     if (code == TSLAUTH_PROVIDER_SUCCESS) {
         FailAssertion("0", "lib/tslauth/ActiveDirectoryProvider", __LINE__,
                       "void ThrowMappedException(ActiveDirectoryClientErrorCode)");
@@ -158,10 +158,8 @@ void ThrowMappedException(ActiveDirectoryClientErrorCode code) {
                          [](MappedException const& left, ActiveDirectoryClientErrorCode right) {
                              return left.code < right;
                          });
-    if (row != std::end(mappedExceptions) && row->code == code) {
-        row->raise(*row);
-    }
-    throw UnknownException(code);
+    bool const found = row != std::end(mappedExceptions) && row->code == code;
+    return found ? *row : unknownException;
 }
 
 } // namespace tessel::authentication
