@@ -30,9 +30,6 @@ class ActiveDirectoryStoreQuestionsTest : public Host::Test {
 protected:
     void SetUp() override {
         Host::Test::SetUp();
-        if (IsSkipped()) {
-            return;
-        }
         UseProvider("gate");
         _impatient = std::make_unique<ActiveDirectoryStore>(NoTime);
         _patient = std::make_unique<ActiveDirectoryStore>(Time);
@@ -40,9 +37,9 @@ protected:
         ASSERT_TRUE(_library);
         _gate = static_cast<Gate*>(dlsym(_library, "gate"));
         ASSERT_TRUE(_gate);
-        Change([](Gate& gate) {
-            gate.code = gate.value = 0;
-            gate.calls = gate.mostInside = 0;
+        Change([](Gate& it) {
+            it.code = it.value = 0;
+            it.calls = it.mostInside = 0;
         });
     }
 
@@ -66,21 +63,21 @@ protected:
         pthread_mutex_unlock(&_gate->lock);
     }
     void Close() {
-        Change([](Gate& gate) { gate.closed = 1; });
+        Change([](Gate& it) { it.closed = 1; });
     }
     void Open() {
-        Change([](Gate& gate) { gate.closed = 0; });
+        Change([](Gate& it) { it.closed = 0; });
     }
     /// Waits until a worker has reached the gate; ctest ends a test that waits for ever.
     void AwaitSomebodyInside() {
-        Await([](Gate const& gate) { return gate.inside != 0; });
+        Await([](Gate const& it) { return it.inside != 0; });
     }
     void AwaitNobodyInside() {
-        Await([](Gate const& gate) { return gate.inside == 0; });
+        Await([](Gate const& it) { return it.inside == 0; });
     }
     unsigned Calls() {
         unsigned calls = 0;
-        Change([&](Gate& gate) { calls = gate.calls; });
+        Change([&](Gate& it) { calls = it.calls; });
         return calls;
     }
 
@@ -117,7 +114,7 @@ private:
 };
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, AnswersComeFromTheProvider) {
-    Change([](Gate& gate) { gate.value = 42; });
+    Change([](Gate& it) { it.value = 42; });
     std::deque<Domain> const domains = _patient->GetTrustedDomains();
     ASSERT_EQ(1U, domains.size());
     EXPECT_EQ("other.example", domains[0].DNSName());
@@ -137,16 +134,16 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, FieldThatCannotBeToldStaysEmptyAndHide
     EXPECT_EQ("corp.example", configuration.activeDomain.DNSName());
     EXPECT_EQ("", configuration.machineAccountDN);
     // And one that cannot be told any more does not keep its old value.
-    Change([](Gate& gate) { gate.code = 1355; });
+    Change([](Gate& it) { it.code = 1355; });
     EXPECT_EQ("", ConfigurationOf(*_patient).activeDomain.DNSName());
     EXPECT_THAT(ConfigurationOf(*_patient).preferredDomainControllers, IsEmpty());
 }
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, FailureOfTheProviderReachesTheCallerAndSparesTheCache) {
     EXPECT_EQ(1U, _patient->GetTrustedDomains().size());
-    Change([](Gate& gate) { gate.code = 1355; });
+    Change([](Gate& it) { it.code = 1355; });
     EXPECT_THROW(_patient->GetTrustedDomains(), NoSuchDomainException);
-    Change([](Gate& gate) { gate.code = 0; });
+    Change([](Gate& it) { it.code = 0; });
     // While a worker hangs, callers are shown what the failure spared.
     Close();
     std::thread hanging([this] { _patient->GetTrustedDomains(); });
@@ -195,7 +192,7 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, StoreMayBeDestroyedWhileItsWorkerRuns)
 }
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, MissingFileOfTrustedDomainsIsTrustStateSeven) {
-    Change([](Gate& gate) { gate.code = 2; });
+    Change([](Gate& it) { it.code = 2; });
     EXPECT_THROW(_patient->GetTrustedDomains(), FileNotFoundException);
     unsigned const before = Calls();
     EXPECT_EQ(7, _patient->GetDomainTrustState());
@@ -203,9 +200,9 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, MissingFileOfTrustedDomainsIsTrustStat
 }
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, OtherFailureOfTrustedDomainsDoesNotHideTheTrustState) {
-    Change([](Gate& gate) {
-        gate.code = 1355;
-        gate.value = -3;
+    Change([](Gate& it) {
+        it.code = 1355;
+        it.value = -3;
     });
     EXPECT_EQ(-3, _patient->GetDomainTrustState());
 }
@@ -238,7 +235,7 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, ManyCallersShareOneWorkerAQuestion) {
         caller.join();
     }
     unsigned mostInside = 0;
-    Change([&](Gate& gate) { mostInside = gate.mostInside; });
+    Change([&](Gate& it) { mostInside = it.mostInside; });
     EXPECT_EQ(1U, mostInside);
 }
 

@@ -91,9 +91,6 @@ protected:
     static constexpr char const* Provider = "recording";
 
     void SetUp() override {
-        if (!Node::IsInside()) {
-            GTEST_SKIP() << "writes the system's own files, and runs in tools/node alone";
-        }
         Write(Paths::PAMPolicy, Policy);
         Write(Paths::NSSConfiguration, Switch);
         Write(Paths::AuthenticationConfiguration, "remote-authentication-store = \"None\"\n");

@@ -238,9 +238,6 @@ TEST_F(NoRemoteAuthenticationStoreTest, CannotBeWithdrawn) {
 }
 
 TEST(NoRemoteAuthenticationStoreWithoutFactory, FindsTheRecordedStoreAllTheSame) {
-    if (!Node::IsInside()) {
-        GTEST_SKIP() << "writes the system's own files, and runs in tools/node alone";
-    }
     ASSERT_EQ(nullptr, AuthenticationStoreFactory::Instance());
     Record("Example Store");
     NoRemoteAuthenticationStore none;
