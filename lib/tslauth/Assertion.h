@@ -4,8 +4,7 @@
 
 // <cassert> declares this function only while assertions are on.
 extern "C" void __assert_fail(char const* expression, char const* source, unsigned line,
-                              char const* function) noexcept // NOLINT(bugprone-reserved-identifier)
-    __attribute__((__noreturn__));
+                              char const* function) noexcept __attribute__((__noreturn__));
 
 namespace tessel::authentication {
 

@@ -6,11 +6,14 @@
 #include <cerrno>
 #include <csignal>
 #include <cstddef>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <cxxabi.h>
+#include <dlfcn.h>
 #include <exception>
 #include <functional>
+#include <gnu/libc-version.h>
 #include <linux/audit.h>
 #include <linux/filter.h>
 #include <linux/seccomp.h>
@@ -200,6 +203,21 @@ inline char const* NameOf(int number) {
     return "?";
 }
 
+/// Whether the instruction that entered the kernel is the C library's, or that of the page that the
+/// kernel gives 32-bit processes for it. Otherwise the call is one that a sanitizer's runtime makes
+/// for itself, past the C library. The child has this process's addresses.
+inline bool IsOfTheCLibrary(std::uint64_t instruction) {
+    auto const objectOf = [](void const* address) {
+        Dl_info info = {};
+        return ::dladdr(address, &info) != 0 ? std::string(info.dli_fname) : std::string();
+    };
+    auto const address = static_cast<std::uintptr_t>(instruction);
+    // A function that no sanitizer puts one of its own in front of.
+    std::string const library = objectOf(reinterpret_cast<void const*>(&::gnu_get_libc_version));
+    std::string const object = objectOf(reinterpret_cast<void const*>(address));
+    return object == library || object.find("linux-gate") != std::string::npos;
+}
+
 /// Answers the child's calls until it is gone.
 inline void Supervise(int listener, pid_t child,
                       std::function<Decision(std::size_t, std::string const&)> const& decide,
@@ -216,9 +234,11 @@ inline void Supervise(int listener, pid_t child,
         if (::ioctl(listener, SECCOMP_IOCTL_NOTIF_RECV, &call) != 0) {
             continue;
         }
-        std::string const name = NameOf(call.data.nr);
-        outcome.calls.push_back(name);
-        Decision const decision = decide(outcome.calls.size(), name);
+        Decision decision = Happens();
+        if (IsOfTheCLibrary(call.data.instruction_pointer)) {
+            outcome.calls.emplace_back(NameOf(call.data.nr));
+            decision = decide(outcome.calls.size(), outcome.calls.back());
+        }
         seccomp_notif_resp answer = {};
         answer.id = call.id;
         switch (decision.kind) {
