@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/systemconfiguration/NSSConfiguration.h>
 
+#include "GoldenFiles.h"
 #include "SystemFileModels.h"
 
 #include <gtest/gtest.h>

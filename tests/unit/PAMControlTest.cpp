@@ -158,9 +158,7 @@ TEST(PAMControlTest, APlainControlIsNotABracketedText) {
 
 TEST(PAMControlTest, ExceptionStandsOutsideTheFamilyOfTheLibrary) {
     static_assert(std::is_base_of<std::exception, InvalidControlException>::value, "");
-    InvalidControlException const error("text");
-    InvalidControlException const copy(error);
-    EXPECT_STREQ(copy.what(), "text");
+    EXPECT_STREQ(InvalidControlException("text").what(), "text");
 }
 
 } // namespace

@@ -8,12 +8,6 @@
 #include "systemconfiguration/NSSConfigurationText.h"
 #include "systemconfiguration/PAMPolicyText.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <list>
 #include <random>
 #include <sstream>
@@ -22,8 +16,8 @@
 #include <string_view>
 #include <vector>
 
-/// What the tests of the system-file models share: reading in both ways, saying exactly what was
-/// read, and the golden files.
+/// What the tests and the fuzz targets of the system-file models share: reading and printing in
+/// both ways, and saying exactly what was read and how it ended.
 namespace SystemFileModels {
 
 using namespace SystemConfiguration;
@@ -148,39 +142,6 @@ inline std::string RandomText(std::mt19937& random, std::vector<std::string> con
         text += words[random() % words.size()];
     }
     return text;
-}
-
-inline std::string Contents(std::filesystem::path const& path) {
-    std::ifstream in(path, std::ios::binary);
-    if (!in) {
-        throw std::runtime_error("cannot read " + path.string());
-    }
-    return {std::istreambuf_iterator<char>(in), {}};
-}
-
-/// Each `NAME.in` below the model's folder must read and print as `NAME.out` says, or fail as
-/// `NAME.error` says. Both ways of reading, and both of printing.
-template <typename Kind> void ExpectGoldenFiles(std::size_t atLeast) {
-    auto const folder = std::filesystem::path(TESTS_DATA_DIR) / Kind::folder;
-    std::size_t cases = 0;
-    for (auto const& file : std::filesystem::directory_iterator(folder)) {
-        auto path = file.path();
-        if (path.extension() != ".in") {
-            continue;
-        }
-        ++cases;
-        SCOPED_TRACE(path.filename());
-        auto const text = Contents(path);
-        bool const fails = std::filesystem::exists(path.replace_extension(".error"));
-        auto expected = Contents(fails ? path : path.replace_extension(".out"));
-        if (fails && !expected.empty() && expected.back() == '\n') {
-            expected.pop_back();
-        }
-        EXPECT_EQ(Normalised<Kind>(text), expected);
-        EXPECT_EQ(NormalisedThroughStreams<Kind>(text), expected);
-        EXPECT_EQ(FromText<Kind>(text), FromStream<Kind>(text));
-    }
-    EXPECT_GE(cases, atLeast);
 }
 
 } // namespace SystemFileModels
