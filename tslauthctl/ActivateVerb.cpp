@@ -67,7 +67,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Output& output) 
             output.ErrorDetail("with --accept-loss 'None' is recorded all the same, and the "
                                "provider's entries stay in the files");
         }
-        output.ErrorDetail("'tslauthctl prepare' shows what keeps the library from reading a file");
+        AddPrepareHint(*plan.refusal, output);
         return ExitCode::refused;
     }
     if (plan.Loses() && !acceptLoss) {

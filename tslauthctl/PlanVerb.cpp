@@ -7,6 +7,14 @@
 
 namespace tessel::tslauthctl {
 
+void AddPrepareHint(Refusal const& refusal, Output& output) {
+    bool const reader = refusal.exceptionClass.rfind("SystemConfiguration::", 0) == 0 ||
+                        refusal.exceptionClass == "std::out_of_range";
+    if (reader) {
+        output.ErrorDetail("'tslauthctl prepare' shows what keeps the library from reading a file");
+    }
+}
+
 void DescribePlan(Plan const& plan, Output& output) {
     auto& document = output.Document();
     document["store"] = plan.store;
@@ -50,7 +58,7 @@ ExitCode RunPlan(std::string const& store, Output& output) {
         output.ErrorDetail(plan.refusedAfterwards
                                ? "the library would write the above first, and then refuse"
                                : "the library would refuse; nothing would be changed");
-        output.ErrorDetail("'tslauthctl prepare' shows what keeps it from reading a file");
+        AddPrepareHint(*plan.refusal, output);
         return ExitCode::refused;
     }
     if (plan.Loses()) {

@@ -255,12 +255,7 @@ private:
                 return;
             }
         }
-        GiveUp(IsEdited(line.database)
-                   ? "the library puts its service before '" + NSSText(line.services) +
-                         "', and then drops the services that stand before a bracket"
-                   : "'" + NSSText(line.services) +
-                         "' cannot be written without a blank in a bracket, and the library drops "
-                         "the services around one");
+        GiveUp(Obstacle(line));
         auto names = line;
         for (auto& service : names.services) {
             service.actions = DefaultNSSActions;
@@ -271,6 +266,21 @@ private:
         } else {
             Keep();
         }
+    }
+
+    /// Why no form of the line is carried.
+    static std::string Obstacle(NSSLine const& line) {
+        if (line.services.empty()) {
+            return "the library drops a line without services, and '" + line.database +
+                   "' is then asked by default";
+        }
+        if (IsEdited(line.database)) {
+            return "the library puts its service before '" + NSSText(line.services) +
+                   "', and then drops the services that stand before a bracket";
+        }
+        return "'" + NSSText(line.services) +
+               "' cannot be written without a blank in a bracket, and the library drops the "
+               "services around one";
     }
 
     std::string Reason(NSSLine const& line) const {

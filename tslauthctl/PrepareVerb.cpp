@@ -67,37 +67,39 @@ std::string Place(std::string const& path, PreparedLine const& line) {
     return line.number > 0 ? path + ":" + std::to_string(line.number) : path;
 }
 
-struct Outcome {
-    bool changes = false;
-    bool loses = false;
+/// What is to become of one file.
+struct PreparedFile {
+    std::string path;
+    std::string before;
+    Prepared prepared;
+
+    bool Changes() const {
+        return prepared.text != before;
+    }
 };
 
-void PrepareFile(std::string const& path, std::string const& before, Prepared const& prepared,
-                 bool write, Output& output, Outcome& outcome) {
-    bool const changes = prepared.text != before;
-    auto const diff = UnifiedDiff(path, before, prepared.text);
+void Describe(PreparedFile const& file, bool write, Output& output) {
+    auto const diff = UnifiedDiff(file.path, file.before, file.prepared.text);
     output.Diff(diff);
-    for (auto const& edit : prepared.edits) {
-        output.Note(Place(path, edit) + ": " + edit.reason);
+    for (auto const& edit : file.prepared.edits) {
+        output.Note(Place(file.path, edit) + ": " + edit.reason);
     }
-    for (auto const& finding : prepared.impossible) {
-        output.Warning(Place(path, finding) + ": no lossless edit exists" +
+    for (auto const& finding : file.prepared.impossible) {
+        output.Warning(Place(file.path, finding) + ": no lossless edit exists" +
                        (finding.before.empty() ? "" : " for '" + finding.before + "'") + ": " +
                        finding.reason);
     }
     nlohmann::json original = nullptr;
-    if (changes && write) {
-        original = Write(path, prepared.text);
-        output.Line("changed " + path + "; the original is " + original.get<std::string>());
+    if (write && file.Changes()) {
+        original = Write(file.path, file.prepared.text);
+        output.Line("changed " + file.path + "; the original is " + original.get<std::string>());
     }
-    output.Document()["files"].push_back({{"path", path},
-                                          {"changed", changes},
+    output.Document()["files"].push_back({{"path", file.path},
+                                          {"changed", file.Changes()},
                                           {"diff", diff},
-                                          {"edits", Described(prepared.edits)},
-                                          {"impossible", Described(prepared.impossible)},
+                                          {"edits", Described(file.prepared.edits)},
+                                          {"impossible", Described(file.prepared.impossible)},
                                           {"original", original}});
-    outcome.changes = outcome.changes || changes;
-    outcome.loses = outcome.loses || !prepared.impossible.empty();
 }
 
 /// The configured provider's entries, or such as any provider might bring.
@@ -112,26 +114,36 @@ ProviderEntries EntriesToCarry(Output& output) {
 
 ExitCode Prepare(bool write, bool acceptLoss, Output& output) {
     auto const entries = EntriesToCarry(output);
-    auto& document = output.Document();
-    document["written"] = write;
-    document["files"] = nlohmann::json::array();
-    Outcome outcome;
     auto const policy = ReadFile(Paths::PAMPolicy);
     auto const services = ReadFile(Paths::NSSConfiguration);
-    PrepareFile(Paths::PAMPolicy, policy, PreparePAM(policy, entries, ReadPolicy, acceptLoss),
-                write, output, outcome);
-    PrepareFile(Paths::NSSConfiguration, services, PrepareNSS(services, entries, acceptLoss), write,
-                output, outcome);
-    if (outcome.loses && !acceptLoss) {
+    PreparedFile const files[] = {
+        {Paths::PAMPolicy, policy, PreparePAM(policy, entries, ReadPolicy, acceptLoss)},
+        {Paths::NSSConfiguration, services, PrepareNSS(services, entries, acceptLoss)}};
+    bool changes = false;
+    bool loses = false;
+    for (auto const& file : files) {
+        changes = changes || file.Changes();
+        loses = loses || !file.prepared.impossible.empty();
+    }
+    // A file that cannot be carried anyhow is not changed half way.
+    bool const refused = loses && !acceptLoss;
+    auto& document = output.Document();
+    document["written"] = write && !refused;
+    document["files"] = nlohmann::json::array();
+    for (auto const& file : files) {
+        Describe(file, write && !refused, output);
+    }
+    if (refused) {
+        if (write) {
+            output.Line(
+                "Nothing was changed. With --accept-loss the files are edited all the same.");
+        }
         return ExitCode::loss;
     }
-    if (outcome.changes && !write) {
-        return ExitCode::changes;
-    }
-    if (!outcome.changes) {
+    if (!changes) {
         output.Line("Nothing has to be prepared.");
     }
-    return ExitCode::done;
+    return changes && !write ? ExitCode::changes : ExitCode::done;
 }
 
 } // namespace

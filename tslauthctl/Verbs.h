@@ -12,6 +12,7 @@
 namespace tessel::tslauthctl {
 
 struct Plan;
+struct Refusal;
 
 ExitCode RunStores(Output& output);
 ExitCode RunStatus(Output& output);
@@ -22,6 +23,9 @@ ExitCode RunPrepare(bool write, bool acceptLoss, Output& output);
 /// What `plan` shows of a plan, and `activate` before it refuses: JSON fields "store", "recorded",
 /// "files" and "refusal".
 void DescribePlan(Plan const& plan, Output& output);
+
+/// Below a refusal that comes from the reader of a system file.
+void AddPrepareHint(Refusal const& refusal, Output& output);
 
 } // namespace tessel::tslauthctl
 
