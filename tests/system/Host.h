@@ -88,7 +88,7 @@ template <typename Call> std::string FailureOf(Call call) {
 /// Sets up a host whose active store is "None" and whose provider is `Provider`.
 class Test : public testing::Test {
 protected:
-    static constexpr char const* Provider = "recording";
+    static constexpr char const* Provider = "plain";
 
     void SetUp() override {
         Write(Paths::PAMPolicy, Policy);

@@ -151,11 +151,11 @@ TEST_F(NoRemoteAuthenticationStoreTest, KeepsOtherKeysInByteOrder) {
 TEST_F(NoRemoteAuthenticationStoreTest, WithdrawsActiveDirectory) {
     auto const before = Host::Read(Paths::PAMPolicy);
     _factory.CreateInstance("Active Directory")->MakeActive();
-    EXPECT_NE(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_recording.so"));
+    EXPECT_NE(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_plain.so"));
     _none.MakeActive();
     EXPECT_EQ(None, Recorded());
-    EXPECT_EQ(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_recording.so"));
-    EXPECT_EQ(std::string::npos, Host::Read(Paths::NSSConfiguration).find("recording"));
+    EXPECT_EQ(std::string::npos, Host::Read(Paths::PAMPolicy).find("pam_plain.so"));
+    EXPECT_EQ(std::string::npos, Host::Read(Paths::NSSConfiguration).find("plain"));
 }
 
 TEST_F(NoRemoteAuthenticationStoreTest, UnknownStoreIsReportedOnceAndNoneStaysRecorded) {
