@@ -115,7 +115,8 @@ TEST_F(NoRemoteAuthenticationStoreTest, IsNamedNone) {
 TEST_F(NoRemoteAuthenticationStoreTest, ConfigurationIsOfItsOwnClass) {
     std::auto_ptr<StoreConfiguration> const configuration = _none.GetStoreConfiguration();
     ASSERT_TRUE(configuration.get());
-    EXPECT_EQ(typeid(NoRemoteAuthenticationStoreConfiguration), typeid(*configuration));
+    StoreConfiguration const& configured = *configuration;
+    EXPECT_EQ(typeid(NoRemoteAuthenticationStoreConfiguration), typeid(configured));
 }
 
 TEST_F(NoRemoteAuthenticationStoreTest, ActivatingItAgainTouchesNothing) {

@@ -22,7 +22,8 @@ void ExpectMember(Class const& exception, unsigned long code, std::string const&
 
     std::unique_ptr<Exception> const clone(static_cast<Exception const&>(exception).Clone());
     EXPECT_NE(static_cast<Exception const*>(&exception), clone.get());
-    EXPECT_EQ(typeid(Class), typeid(*clone));
+    Exception const& copy = *clone;
+    EXPECT_EQ(typeid(Class), typeid(copy));
     EXPECT_EQ(code, clone->Code());
     EXPECT_EQ(message, clone->what());
 
@@ -66,7 +67,7 @@ typedef testing::Types<
     TimeSkewException, WSATimedOutException, WkstaNotStartedException,
     InvalidCAMCertificateException>
     CodedClasses;
-TYPED_TEST_SUITE(CodedException, CodedClasses);
+TYPED_TEST_SUITE(CodedException, CodedClasses, );
 
 TYPED_TEST(CodedException, CarriesItsCodeAndPrefixedText) {
     ExpectMember(TypeParam(0x54b, "Some text."), 0x54b, "Exception 0x0000054b: Some text.");
@@ -79,7 +80,7 @@ typedef testing::Types<ConfigurationError, InvalidKeyException, IOError, FilePer
                        UnknownRemoteAuthenticationStoreException, InvalidIPAddressException,
                        ProviderCallTimedOutException, ThreadErrorException>
     PlainClasses;
-TYPED_TEST_SUITE(PlainException, PlainClasses);
+TYPED_TEST_SUITE(PlainException, PlainClasses, );
 
 TYPED_TEST(PlainException, CarriesTheFinishedMessageAndNoCode) {
     ExpectMember(TypeParam("Some text"), 0, "Some text");
