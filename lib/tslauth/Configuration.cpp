@@ -4,11 +4,15 @@
 #include "SystemFile.h"
 
 #include <algorithm>
+#include <array>
 #include <cstdint>
+#include <cstring>
+#include <endian.h>
 #include <fstream>
 #include <string_view>
 #include <tslauth/AtomicFileStream.h>
 #include <tslauth/Exceptions.h>
+#include <utility>
 #include <vector>
 
 namespace tessel::authentication {
@@ -83,63 +87,90 @@ std::string_view::size_type CommonPrefix(std::string_view left, std::string_view
 
 /// The first eight bytes of `key` as a number that is ordered like them.
 std::uint64_t Rank(std::string_view key) {
-    std::uint64_t rank = 0;
-    for (std::size_t i = 0; i < sizeof rank; ++i) {
-        rank = rank << 8 | (i < key.size() ? static_cast<unsigned char>(key[i]) : 0U);
+    std::uint64_t bytes = 0;
+    std::memcpy(&bytes, key.data(), std::min(key.size(), sizeof bytes));
+    return be64toh(bytes);
+}
+
+struct Place {
+    std::uint64_t rank;
+    std::size_t index;
+};
+
+/// Sorts by rank and keeps the order of equal ranks: byte for byte from the last on, leaving out
+/// those that are the same everywhere.
+void SortByRank(std::vector<Place>& places) {
+    std::array<std::array<std::size_t, 256>, sizeof(Place::rank)> counts = {};
+    for (Place const& place : places) {
+        for (std::size_t byte = 0; byte < counts.size(); ++byte) {
+            ++counts[byte][place.rank >> 8 * byte & 0xff];
+        }
     }
-    return rank;
+    std::vector<Place> sorted(places.size());
+    for (std::size_t byte = 0; byte < counts.size(); ++byte) {
+        std::array<std::size_t, 256>& count = counts[byte];
+        if (count[places.front().rank >> 8 * byte & 0xff] == places.size()) {
+            continue;
+        }
+        std::size_t start = 0;
+        for (std::size_t& slot : count) {
+            start += std::exchange(slot, start);
+        }
+        for (Place const& place : places) {
+            sorted[count[place.rank >> 8 * byte & 0xff]++] = place;
+        }
+        places.swap(sorted);
+    }
 }
 
 /// The order in which `assignments` enter the map: by key, and the first of a key before its
-/// others. Sorted by numbers where they tell keys apart, because a large file's keys lie all over
-/// the memory: comparing them in place takes longer than everything else together.
-std::vector<std::size_t> SortedOrder(std::vector<Assignment> const& assignments) {
+/// others. By numbers as far as they tell keys apart, because a large file's keys lie all over the
+/// memory: comparing them in place takes longer than everything else together.
+std::vector<Place> SortedOrder(std::vector<Assignment> const& assignments) {
     std::string_view shared = assignments.front().key;
     for (Assignment const& assignment : assignments) {
-        shared = shared.substr(0, CommonPrefix(shared, assignment.key));
+        if (assignment.key.compare(0, shared.size(), shared) != 0) {
+            shared = shared.substr(0, CommonPrefix(shared, assignment.key));
+        }
     }
-    struct Place {
-        std::uint64_t rank;
-        std::size_t index;
-    };
     std::vector<Place> places;
     places.reserve(assignments.size());
     for (Assignment const& assignment : assignments) {
         places.push_back({Rank(assignment.key.substr(shared.size())), places.size()});
     }
-    std::sort(places.begin(), places.end(), [&](Place const& left, Place const& right) {
-        if (left.rank != right.rank) {
-            return left.rank < right.rank;
+    SortByRank(places);
+    for (auto first = places.begin(); first != places.end();) {
+        auto const last = std::find_if(
+            first, places.end(), [&](Place const& place) { return place.rank != first->rank; });
+        if (last - first > 1) {
+            std::stable_sort(first, last, [&](Place const& left, Place const& right) {
+                return assignments[left.index].key < assignments[right.index].key;
+            });
         }
-        int const order = assignments[left.index].key.compare(assignments[right.index].key);
-        return order != 0 ? order < 0 : left.index < right.index;
-    });
-    std::vector<std::size_t> order;
-    order.reserve(places.size());
-    for (Place const& place : places) {
-        order.push_back(place.index);
+        first = last;
     }
-    return order;
+    return places;
 }
 
 /// Adds the assignments whose keys are not there yet, at the cost of one walk through the map.
 void Merge(std::map<std::string, std::string>& map, std::vector<Assignment> const& assignments) {
-    std::vector<std::size_t> const order = SortedOrder(assignments);
+    std::vector<Place> const order = SortedOrder(assignments);
     // The next ones are asked for while one is added: they lie all over a large file's memory, and
     // waiting for each would take longer than everything else together.
     static constexpr std::size_t ahead = 16;
     auto next = map.begin();
     for (std::size_t i = 0; i < order.size(); ++i) {
         if (i + 2 * ahead < order.size()) {
-            __builtin_prefetch(&assignments[order[i + 2 * ahead]]);
-            __builtin_prefetch(assignments[order[i + ahead]].key.data());
+            __builtin_prefetch(&assignments[order[i + 2 * ahead].index]);
+            __builtin_prefetch(assignments[order[i + ahead].index].key.data());
         }
-        Assignment const& assignment = assignments[order[i]];
+        Assignment const& assignment = assignments[order[i].index];
         while (next != map.end() && next->first < assignment.key) {
             ++next;
         }
         if (next == map.end() || next->first != assignment.key) {
-            next = map.emplace_hint(next, assignment.key, assignment.value);
+            // Goes in front of `next`, unless it is there already.
+            map.emplace_hint(next, assignment.key, assignment.value);
         }
     }
 }
