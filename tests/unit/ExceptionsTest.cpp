@@ -22,8 +22,8 @@ void ExpectMember(Class const& exception, unsigned long code, std::string const&
 
     std::unique_ptr<Exception> const clone(static_cast<Exception const&>(exception).Clone());
     EXPECT_NE(static_cast<Exception const*>(&exception), clone.get());
-    Exception const& copy = *clone;
-    EXPECT_EQ(typeid(Class), typeid(copy));
+    Exception const& cloned = *clone;
+    EXPECT_EQ(typeid(Class), typeid(cloned));
     EXPECT_EQ(code, clone->Code());
     EXPECT_EQ(message, clone->what());
 
