@@ -2,6 +2,8 @@
 #ifndef STRANDCTL_HOSTCTLEXCEPTION_H
 #define STRANDCTL_HOSTCTLEXCEPTION_H
 
+#include "Export.h"
+
 #include <exception>
 #include <string>
 
@@ -10,7 +12,7 @@ namespace Lib {
 
 /// The one failure that the host-control library reports: a text that says what could not be done.
 /// A value; copying and destroying are safe from any thread.
-class __attribute__((visibility("default"))) HostCtlException : public std::exception {
+class STRANDCTL_EXPORT HostCtlException : public std::exception {
 public:
     /// @param text the complete message
     explicit HostCtlException(std::string const& text);
