@@ -10,8 +10,8 @@ extern "C" {
 
 enum { RECORDING_ENTRIES = 16, RECORDING_ARGUMENTS = 10, RECORDING_TEXT = 64 };
 
-/* What recording.c answers, and what was done to it. The library exports one, `recording`, which a
- * test finds with dlsym; loading it afresh empties it. For one thread at a time. */
+/* What a recording provider answers, and what was done to it. The library exports one, `recording`,
+ * which a test finds with dlsym; loading it afresh empties it. For one thread at a time. */
 typedef struct Recording {
     /* Set by the test. Results are handed out also where `code` says failure. */
     int code;   /* of every entry that returns one */

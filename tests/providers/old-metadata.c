@@ -2,4 +2,4 @@
 /* Newer operations than metadata. */
 #define METADATA_VERSION 1
 #define OPERATIONS_VERSION 2
-#include "recording.c"
+#include "RecordingEntries.h"

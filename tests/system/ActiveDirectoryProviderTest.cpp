@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "Failure.h"
+#include "LoadedProvider.h"
 #include "MappedCodes.h"
 #include "Node.h"
 #include "providers/Recording.h"
@@ -57,40 +59,11 @@ namespace {
 constexpr char folder[] = "/usr/libexec/tslauth";
 
 std::string PathOf(std::string const& name) {
-    return std::string(folder) + "/lib" + name + ".so";
+    return LoadedProvider::PathOf(name);
 }
 
 bool IsLoaded(std::string const& name) {
-    void* const library = dlopen(PathOf(name).c_str(), RTLD_LAZY | RTLD_NOLOAD);
-    if (library == nullptr) {
-        return false;
-    }
-    (void)dlclose(library); // the count that the question itself added
-    return true;
-}
-
-/// A failure as a whole: class, code and message.
-struct Failure {
-    std::type_index type;
-    unsigned long code;
-    std::string message;
-
-    bool operator==(Failure const& other) const {
-        return type == other.type && code == other.code && message == other.message;
-    }
-};
-
-std::ostream& operator<<(std::ostream& stream, Failure const& failure) {
-    return stream << failure.type.name() << ' ' << failure.code << " \"" << failure.message << '"';
-}
-
-template <typename Call> Failure FailureOf(Call call) {
-    try {
-        call();
-    } catch (Exception const& failure) {
-        return {typeid(failure), failure.Code(), failure.what()};
-    }
-    return {typeid(void), 0, "(none)"};
+    return LoadedProvider::IsLoaded(name);
 }
 
 Failure LoadingOf(std::string const& name) {
@@ -104,17 +77,6 @@ Failure Unopened(std::string const& loaderText) {
 Failure Invalid(std::string const& name, std::string const& reason) {
     return {typeid(InvalidActiveDirectoryProviderException), 0,
             "The specified Active Directory provider '" + name + "' is invalid: " + reason};
-}
-
-Failure Coded(std::type_index type, unsigned long code, std::string const& text) {
-    char digits[9];
-    std::snprintf(digits, sizeof digits, "%08lx", code);
-    return {type, code, std::string("Exception 0x") + digits + ": " + text};
-}
-
-Failure NotImplemented() {
-    return Coded(typeid(CallNotImplementedException), 120,
-                 "This function is not supported on this system.");
 }
 
 Credentials const credentials = {"user", "password"};
@@ -243,18 +205,25 @@ private:
 
 // ---- Loading ------------------------------------------------------------------------------------
 
+// A provider that is added gets a test, here or in the test of what it was made for.
 TEST_F(ActiveDirectoryProviderTest, EveryTestProviderIsKnownHere) {
     std::set<std::string> found;
     std::unique_ptr<DIR, int (*)(DIR*)> const directory(opendir(folder), &closedir);
     ASSERT_NE(nullptr, directory);
     while (dirent const* const entry = readdir(directory.get())) {
-        if (entry->d_name[0] != '.') {
-            found.insert(entry->d_name);
+        std::string const name = entry->d_name;
+        if (name[0] != '.') {
+            found.insert(name);
         }
     }
     EXPECT_EQ((std::set<std::string>{
                   "lib.so",
                   "libblank-parameters.so",
+                  "libcam-lazy.so",
+                  "libcam-missing-operations.so",
+                  "libcam-null-entries.so",
+                  "libcam-recording.so",
+                  "libexample-cam.so",
                   "libexample.so",
                   "libgate.so",
                   "liblazy.so",
@@ -267,6 +236,7 @@ TEST_F(ActiveDirectoryProviderTest, EveryTestProviderIsKnownHere) {
                   "libnull-symbol.so",
                   "libold-metadata.so",
                   "libold-operations.so",
+                  "libplain.so",
                   "librecording.so",
                   "librendezvous.so",
                   "libtoo-new.so",

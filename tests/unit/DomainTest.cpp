@@ -31,11 +31,12 @@ TEST(DomainTest, ItsNamesAreGivenInTheOrderDNSNetBIOS) {
 
 TEST(DomainTest, ACopyHasTheSameNames) {
     Domain const domain("corp.example", "CORP");
-    Domain const copy(domain);
-    Domain assigned;
-    assigned = domain;
+    Domain copy(domain);
     EXPECT_EQ(domain, copy);
-    EXPECT_EQ(domain, assigned);
+    copy = Domain();
+    EXPECT_EQ(Domain(), copy);
+    copy = domain;
+    EXPECT_EQ(domain, copy);
 }
 
 TEST(DomainTest, DomainsAreEqualWhenBothNamesAre) {
