@@ -375,6 +375,167 @@ TEST_F(ActiveDirectoryStoreTest, HugeFilesAreCarriedWhole) {
                 "passwd: plain\ngroup: plain\nshadow: plain\nnetgroup:" + services + "\n");
 }
 
+// Every kind of bad file, for each file
+
+namespace {
+
+/// Gives up root's rights to files for its lifetime.
+class AsNobody {
+public:
+    AsNobody() {
+        EXPECT_EQ(0, seteuid(65534));
+    }
+    ~AsNobody() {
+        EXPECT_EQ(0, seteuid(0));
+    }
+};
+
+/// A line of 1 MiB in the form of a key-value file.
+std::string LongAssignment() {
+    return "long = \"" + std::string(1 << 20, 'x') + "\"\n";
+}
+
+std::string ManyAssignments() {
+    std::string text;
+    for (int i = 100000; i < 200000; ++i) {
+        text += "key" + std::to_string(i) + " = \"" + std::to_string(i) + "\"\n";
+    }
+    return text;
+}
+
+std::string const Binary("\x7f"
+                         "ELF\0\1 \xff\n\0",
+                         10);
+
+} // namespace
+
+TEST_F(ActiveDirectoryStoreTest, UnreadableFileIsNamedAndNothingChanges) {
+    struct {
+        char const* path;
+        char const* message;
+    } const cases[] = {
+        {Paths::PAMPolicy, "Cannot open '/etc/pam.d/system-auth-generic': Permission denied"},
+        {Paths::AuthenticationConfiguration,
+         "Unable to open '/etc/tessel/tslauth/authentication.conf': Permission denied"},
+        {Paths::ProviderConfiguration,
+         "The specified Active Directory provider '(none installed)' is invalid"},
+    };
+    auto const before = Host::Snapshot();
+    for (auto const& unreadable : cases) {
+        ASSERT_EQ(0, chmod(unreadable.path, 0));
+        std::string failure;
+        {
+            AsNobody const nobody;
+            failure = ActivationFailure();
+        }
+        ASSERT_EQ(0, chmod(unreadable.path, 0644));
+        EXPECT_EQ(unreadable.message, failure);
+        EXPECT_EQ(before, Host::Snapshot());
+    }
+    // The policy comes first: give it away, so that the switch is what fails.
+    ASSERT_EQ(0, chown("/etc/pam.d", 65534, 65534));
+    ASSERT_EQ(0, chown(Paths::PAMPolicy, 65534, 65534));
+    ASSERT_EQ(0, chmod(Paths::NSSConfiguration, 0));
+    std::string failure;
+    {
+        AsNobody const nobody;
+        failure = ActivationFailure();
+    }
+    ASSERT_EQ(0, chmod(Paths::NSSConfiguration, 0644));
+    ASSERT_EQ(0, chown("/etc/pam.d", 0, 0));
+    EXPECT_EQ("Cannot open '/etc/nsswitch.conf': Permission denied", failure);
+    EXPECT_EQ(before.at(Paths::NSSConfiguration), Host::Read(Paths::NSSConfiguration));
+}
+
+TEST_F(ActiveDirectoryStoreTest, PolicyWithCarriageReturnsReadsAsWithoutThem) {
+    std::string const withReturns =
+        PolicyAfterActivationOf("# x\r\nauth required pam_unix.so nullok\r\n\r\n");
+    EXPECT_EQ(PolicyAfterActivationOf("auth required pam_unix.so nullok\n"), withReturns);
+}
+
+TEST_F(ActiveDirectoryStoreTest, EmptySwitchGetsTheServicesAlone) {
+    Host::Write(Paths::NSSConfiguration, "");
+    Activate();
+    EXPECT_EQ("passwd: plain\ngroup: plain\nshadow: plain\n", Host::Read(Paths::NSSConfiguration));
+}
+
+TEST_F(ActiveDirectoryStoreTest, BinarySwitchIsRefusedWhole) {
+    Host::Write(Paths::NSSConfiguration, Binary);
+    EXPECT_THROW(Activate(), InvalidDatabaseException);
+    EXPECT_EQ(Binary, Host::Read(Paths::NSSConfiguration));
+}
+
+TEST_F(ActiveDirectoryStoreTest, SwitchOfManyLinesIsCarriedWhole) {
+    std::string lines, services;
+    for (int i = 0; i < 100000; ++i) {
+        lines += "hosts: s" + std::to_string(i) + "\n";
+        services += " s" + std::to_string(i);
+    }
+    std::string const longName(1 << 20, 'x');
+    Host::Write(Paths::NSSConfiguration, lines + "networks: " + longName + "\n");
+    Activate();
+    EXPECT_TRUE(Host::Read(Paths::NSSConfiguration) ==
+                "passwd: plain\ngroup: plain\nshadow: plain\nhosts:" + services +
+                    "\nnetworks: " + longName + "\n");
+}
+
+TEST_F(ActiveDirectoryStoreTest, HugeRecordIsCarriedWhole) {
+    Host::Write(Paths::AuthenticationConfiguration,
+                "remote-authentication-store = None\n" + LongAssignment() + ManyAssignments());
+    Activate();
+    EXPECT_TRUE(Host::Read(Paths::AuthenticationConfiguration) ==
+                ManyAssignments() + LongAssignment() + Recorded);
+}
+
+TEST_F(ActiveDirectoryStoreTest, BadRecordStopsTheActivationBeforeItBegins) {
+    struct {
+        std::string text;
+        char const* message;
+    } const cases[] = {
+        {"", "The specified key 'remote-authentication-store' was not found in this configuration"},
+        {Binary, "Error parsing configuration on line 1: no delimiter found"},
+        {ManyAssignments() + "x\n",
+         "Error parsing configuration on line 100001: no delimiter found"},
+        {LongAssignment() + "x = '", "Error parsing configuration at line 2: invalid quoting"},
+    };
+    for (auto const& bad : cases) {
+        Host::Write(Paths::AuthenticationConfiguration, bad.text);
+        auto const before = Host::Snapshot();
+        EXPECT_EQ(bad.message, ActivationFailure());
+        EXPECT_EQ(before, Host::Snapshot());
+    }
+}
+
+TEST_F(ActiveDirectoryStoreTest, CarriageReturnBelongsToTheRecordedName) {
+    Host::Write(Paths::AuthenticationConfiguration,
+                "remote-authentication-store = \"Active Directory\"\r\n");
+    EXPECT_FALSE(ActiveDirectoryStore(60).IsActive());
+    Activate();
+    EXPECT_EQ(Recorded, Host::Read(Paths::AuthenticationConfiguration));
+}
+
+TEST_F(ActiveDirectoryStoreTest, BadProviderConfigurationIsReportedWithItsText) {
+    struct {
+        std::string text;
+        char const* message;
+    } const cases[] = {
+        {Binary, "Error parsing configuration on line 1: no delimiter found"},
+        {"provider = \"plain\"\r\n",
+         "Unable to open provider: /usr/libexec/tslauth/lib\"plain\"\r.so: cannot open shared "
+         "object file: No such file or directory"},
+        {ManyAssignments() + "provider =\n",
+         "The specified Active Directory provider '(unset)' is invalid"},
+        {LongAssignment() + ManyAssignments() + "provider = absent",
+         "Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared object "
+         "file: No such file or directory"},
+    };
+    for (auto const& bad : cases) {
+        Host::Write(Paths::ProviderConfiguration, bad.text);
+        EXPECT_EQ(bad.message, ConstructionFailure());
+        EXPECT_EQ(bad.text, Host::Read(Paths::ProviderConfiguration));
+    }
+}
+
 TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     ASSERT_EQ(0, mkdir(Paths::PAMPolicy, 0755));
