@@ -4,6 +4,7 @@
 
 #include "ActiveDirectoryProvider.h"
 #include "ActiveDirectoryStoreConfiguration.h"
+#include "Credentials.h"
 #include "DirectoryStore.h"
 #include "Domain.h"
 #include "RequestState.h"
@@ -108,11 +109,100 @@ public:
     /// failure.
     void SetPreferredDomainControllers(std::deque<std::string> const& controllers);
 
+    /// Joins the host to a domain in the name of an account that may add computers. Joining does
+    /// not activate the store.
+    ///
+    /// Unless told to skip it, the host's name is checked and repaired first, so that domain
+    /// controllers will accept the host: its resolved name must begin with its short name, and
+    /// becomes, with the short name as its alias, the hosts-file entry of the management address.
+    /// Where the resolved name is not "SHORTNAME.DOMAIN", a warning goes to the system log, and the
+    /// domain becomes a DNS search domain if it resolves. Nothing of this is undone when a later
+    /// step fails.
+    ///
+    /// Blocks as long as the resolver and the provider do. One join at a time: it edits system
+    /// files.
+    ///
+    /// @param domain the domain's DNS name; after a "/", the organisational unit for the machine
+    ///     account
+    /// @param credentials with a user name, which may be empty, and a password, which may not; the
+    ///     texts are handed to the provider without a copy
+    /// @throws InvalidCredentialsException where either is missing; nothing has been done then
+    /// @throws InvalidHostNameException where the host's name is too long (more than 63 bytes),
+    /// does
+    ///     not resolve, resolves to another short name, or is one of "localhost", "linux" and
+    ///     "hostname"
+    /// @throws HostCtl::Lib::HostCtlException where the hosts file, the DNS configuration or the
+    ///     management interface cannot be read or changed
+    /// @throws the provider's failure
+    void JoinDomain(std::string const& domain, Credentials const& credentials,
+                    bool skipHostnameCheck);
+
+    /// Parts the host from its domain, without credentials or with those of an account that may
+    /// remove it. Parting does not deactivate the store. Blocks as long as the provider does;
+    /// throws its failure.
+    void PartDomain();
+    void PartDomain(Credentials const& credentials);
+
+    /// Pins the certificate that the CAM server at `serverAddress` must present from now on: its
+    /// thumbprint replaces the one in "/etc/tessel/tslauth/camservers.conf".
+    /// @param certificateFile whose first PEM certificate counts
+    /// @param serverAddress an IPv4 address in dotted decimal; other spellings of it are refused
+    /// @throws InvalidIPAddressException before any file is opened
+    /// @throws FileNotFoundException (code 2) if the certificate's file cannot be opened
+    /// @throws InvalidCertificateException if it holds no certificate in PEM form
+    /// @throws InvalidThumbprintStoreException if the store cannot be opened or replaced; it is not
+    ///     created where it does not exist
+    /// @throws ConfigurationError where a line of the store is malformed
+    void ImportCertificateForCAM(std::string const& certificateFile,
+                                 std::string const& serverAddress);
+
+    /// Joins the host without an administrator's credentials: the CAM server at `serverAddress`
+    /// makes the machine account and tells about its domain, and the provider joins with both.
+    /// Whether the server's certificate is verified is the host's option
+    /// "UserVars.ActiveDirectoryVerifyCAMCertificate". Joining does not activate the store.
+    ///
+    /// Nothing is undone when a step fails: a machine account may be left on the server. Blocks as
+    /// long as the resolver, the server and the provider do. One join at a time: it edits system
+    /// files.
+    ///
+    /// @param serverAddress as for `ImportCertificateForCAM`. A server without a pinned thumbprint
+    /// is
+    ///     asked all the same; to accept it or not is the CAM provider's decision
+    /// @param organisationalUnit for the machine account; empty leaves it to the server
+    /// @param skipHostnameCheck leaves the host's name and name resolution alone; see `JoinDomain`
+    /// @throws InvalidIPAddressException before anything else is done
+    /// @throws HostCtl::Lib::HostCtlException where the option cannot be read, and as `JoinDomain`
+    /// @throws InvalidVerifyCAMCertificateOptionException where its value is neither 0 nor 1
+    /// @throws InvalidHostNameException as `JoinDomain`; "unable to get hostname" also where the
+    ///     check is skipped
+    /// @throws InvalidCAMProxyProviderException for the name "(unset)" where `camprovider.conf`
+    ///     names no CAM provider, for "(none installed)" where the file or the provider cannot be
+    ///     opened, and where the provider lacks its record
+    /// @throws InvalidKeyException where `camprovider.conf` lacks its key
+    /// @throws InvalidThumbprintStoreException where the thumbprints cannot be read
+    /// @throws ConfigurationError where a line of either file is malformed
+    /// @throws what `CAMProxy`'s operations throw, `InvalidCAMCertificateException` among it, and
+    /// the
+    ///     provider's failure
+    void JoinDomainWithCAM(std::string const& serverAddress, std::string const& organisationalUnit,
+                           bool skipHostnameCheck);
+
+    /// The DNS name of the domain that the CAM server at `serverAddress` serves. Its certificate is
+    /// not verified, so believe the answer no more than the network. Blocks as long as the server
+    /// does.
+    /// @throws InvalidIPAddressException, InvalidCAMProxyProviderException, InvalidKeyException,
+    ///     ConfigurationError as `JoinDomainWithCAM`
+    /// @throws what `CAMProxy`'s operations throw
+    std::string GetDomainForCAMService(std::string const& serverAddress) const;
+
 private:
     typedef boost::shared_ptr<ActiveDirectoryProvider> ProviderPointer;
     typedef boost::shared_ptr<RequestState> StatePointer;
 
     SystemConfiguration::PAMEntry GetPAMEntryForProvider() const;
+
+    /// Checks and repairs the host's name before a join to `domain`; see `JoinDomain`.
+    void SanitiseHostnameForDomain(std::string const& domain) const;
 
     // The workers. Each stores its answer in the store's own cache object, so that an answer that
     // came too late for its caller serves the next one.
