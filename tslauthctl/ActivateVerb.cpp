@@ -47,7 +47,10 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Output& output) 
     auto& document = output.Document();
     document["changed"] = nlohmann::json::array();
     document["store"] = store;
-    document["recorded"] = plan.recorded;
+    document["recorded"] = nullptr;
+    if (!plan.recorded.empty() || !plan.refusal) {
+        document["recorded"] = plan.recorded;
+    }
     document["losses"] = nlohmann::json::array();
     for (auto const& file : plan.files) {
         for (auto const& loss : file.losses) {

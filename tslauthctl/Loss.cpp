@@ -248,6 +248,11 @@ std::vector<std::string> PAMLosses(std::string_view before, std::string_view aft
         auto const inserted = Meaning(entry, facility);
         if (auto const place = PlaceOf(inserted, shorter, longer)) {
             CompareJumps(facility, shorter, longer, *place, reader, losses);
+            if (edit == Edit::insert && !RunsAnything(was, reader)) {
+                losses.push_back(std::string(facility) +
+                                 ": the policy 'other', which decides where there is no entry, "
+                                 "would no longer");
+            }
             continue;
         }
         auto oldItems = ItemsOf(was);

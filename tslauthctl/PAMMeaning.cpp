@@ -17,6 +17,10 @@ constexpr int deepestInclude = 16;
 
 constexpr std::string_view separators = " \n\t";
 
+/// Stands at the head of a policy by custom. It is no comment that anybody would miss: the library
+/// writes one of its own.
+constexpr std::string_view policyHeader = "#%PAM-1.0";
+
 /// A text as libpam gets it line by line: in pieces that its buffer holds.
 class LineSource {
 public:
@@ -68,7 +72,9 @@ Assembled AssembleLine(LineSource& source, std::string& line, std::size_t& first
         }
         auto const start = piece.find_first_not_of(separators);
         if (start == std::string_view::npos || piece[start] == '#') {
-            comments += start == std::string_view::npos ? 0 : 1;
+            bool const comment = start != std::string_view::npos &&
+                                 piece.substr(start, policyHeader.size()) != policyHeader;
+            comments += comment ? 1U : 0U;
             continue;
         }
         if (!used) {
@@ -307,6 +313,12 @@ std::vector<PAMLine> PAMStackOf(PAMMeaning const& meaning, std::string const& fa
         }
     }
     return stack;
+}
+
+bool RunsAnything(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader) {
+    std::vector<Step> steps;
+    Flatten(stack, reader, 0, std::nullopt, steps);
+    return !steps.empty();
 }
 
 std::vector<PAMJump> PAMJumps(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader) {

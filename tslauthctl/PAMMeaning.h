@@ -75,6 +75,10 @@ struct PAMJump {
     std::size_t within = 0;
 };
 
+/// Whether a stack runs anything at all. Where it does not, libpam goes by the policy "other". An
+/// include that cannot be read counts as something.
+bool RunsAnything(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader);
+
 /// The jumps of the lines themselves, and those out of what they include.
 std::vector<PAMJump> PAMJumps(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader);
 

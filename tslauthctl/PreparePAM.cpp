@@ -14,9 +14,10 @@ using authentication::ProviderModules::EditedPAMPolicy;
 
 constexpr int deepestInclude = 16;
 
-/// Stands after a piece that is looked at on its own: a line that ends too early takes from the
-/// next one, and that shows then.
-constexpr char sentinel[] = "session\toptional\tafter_it.so\n";
+/// Stand around a piece that is looked at on its own: every edited facility has an entry, and a
+/// line that ends too early takes from the next one, which shows then.
+constexpr char before[] = "auth\trequired\tbefore_it.so\naccount\trequired\tbefore_it.so\n";
+constexpr char behind[] = "session\toptional\tbehind_it.so\n";
 
 std::vector<std::string> RoundTripLosses(std::string const& text, ProviderEntries const& provider,
                                          PAMPolicyReader const& reader) {
@@ -35,7 +36,7 @@ std::optional<std::string> Nothing(std::string const&) {
 }
 
 bool CarriesPiece(std::string const& piece, ProviderEntries const& provider) {
-    auto const losses = RoundTripLosses(piece + "\n" + sentinel, provider, Nothing);
+    auto const losses = RoundTripLosses(before + piece + "\n" + behind, provider, Nothing);
     return std::all_of(losses.begin(), losses.end(), [](std::string const& loss) {
         return loss.find(": the jump '") != std::string::npos;
     });

@@ -29,9 +29,11 @@ std::vector<std::string> NSSInsertLosses(std::string const& text,
                      service);
 }
 
-std::vector<std::string> PAMInsertLosses(std::string const& text,
+/// Of `text` and an "account" that is no matter.
+std::vector<std::string> PAMInsertLosses(std::string text,
                                          PAMPolicyReader const& reader = NoPolicy) {
     auto const entry = PAMEntryFor("pam_prov.so", {"a"});
+    text = "auth required first.so\naccount required a.so\n" + text;
     return PAMLosses(text, EditedPAMPolicy(text, Edit::insert, entry), Edit::insert, entry, reader);
 }
 
@@ -144,6 +146,18 @@ TEST(LossTest, AnEntryThatEndsTooEarlyTakesFromTheNext) {
 
 TEST(LossTest, ACarriageReturnIsPartOfTheLastWordToLibpam) {
     EXPECT_THAT(PAMInsertLosses("session required b.so\r\n"), Not(IsEmpty()));
+}
+
+TEST(LossTest, AFacilityWithoutEntriesWasDecidedByAnotherPolicy) {
+    auto const entry = PAMEntryFor("pam_prov.so", {});
+    constexpr char text[] = "auth required u.so\naccount include empty\n";
+    auto const empty = [](std::string const&) { return std::optional<std::string>(""); };
+    EXPECT_THAT(
+        PAMLosses(text, EditedPAMPolicy(text, Edit::insert, entry), Edit::insert, entry, empty),
+        ElementsAre(HasSubstr("account: the policy 'other'")));
+    EXPECT_THAT(
+        PAMLosses(text, EditedPAMPolicy(text, Edit::insert, entry), Edit::insert, entry, NoPolicy),
+        IsEmpty());
 }
 
 TEST(LossTest, TheClassOfAnExceptionIsNamedInFull) {

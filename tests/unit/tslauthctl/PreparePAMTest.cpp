@@ -26,9 +26,13 @@ std::optional<std::string> ReadTestPolicy(std::string const& name) {
     return std::nullopt;
 }
 
+/// Both facilities that the library edits have an entry.
+std::string const usual = "auth required a.so\naccount required a.so\n";
+
 std::string PreparedText(std::string const& text) {
-    auto const prepared = PreparePAM(text, PlaceholderEntries(), ReadTestPolicy, false);
-    return prepared.impossible.empty() ? prepared.text : "(impossible)";
+    auto const prepared = PreparePAM(usual + text, PlaceholderEntries(), ReadTestPolicy, false);
+    EXPECT_EQ(usual, prepared.text.substr(0, usual.size()));
+    return prepared.impossible.empty() ? prepared.text.substr(usual.size()) : "(impossible)";
 }
 
 TEST(PreparePAMTest, WhatTheLibraryCarriesStaysByteForByte) {
@@ -73,8 +77,15 @@ TEST(PreparePAMTest, TheHiddenEndOfALongCommentIsALineToLibpam) {
     EXPECT_EQ("auth\trequired\tu.so\n", PreparedText(comment + "auth required u.so\n"));
 }
 
+TEST(PreparePAMTest, AFacilityWithoutEntriesCannotBePrepared) {
+    auto const prepared =
+        PreparePAM("auth required u.so\n", PlaceholderEntries(), ReadTestPolicy, false);
+    ASSERT_THAT(prepared.impossible, SizeIs(1));
+    EXPECT_THAT(prepared.impossible[0].reason, HasSubstr("account: the policy 'other'"));
+}
+
 TEST(PreparePAMTest, AJumpOverThePlaceOfTheEntryCannotBePrepared) {
-    auto const prepared = PreparePAM("auth [success=2 default=ignore] u.so\n"
+    auto const prepared = PreparePAM("account required a.so\nauth [success=2 default=ignore] u.so\n"
                                      "auth required /lib/security/$ISA/pam_access.so\n"
                                      "auth required b.so\nauth required c.so\n",
                                      PlaceholderEntries(), ReadTestPolicy, false);
@@ -83,9 +94,9 @@ TEST(PreparePAMTest, AJumpOverThePlaceOfTheEntryCannotBePrepared) {
 }
 
 TEST(PreparePAMTest, AnAcceptedLossIsEditedAndStillNamed) {
-    auto const prepared =
-        PreparePAM("-auth required u.so [a  b]\n", PlaceholderEntries(), ReadTestPolicy, true);
-    EXPECT_EQ("auth\trequired\tu.so\t[a b]\n", prepared.text);
+    auto const prepared = PreparePAM(usual + "-auth required u.so [a  b]\n", PlaceholderEntries(),
+                                     ReadTestPolicy, true);
+    EXPECT_EQ(usual + "auth\trequired\tu.so\t[a b]\n", prepared.text);
     EXPECT_THAT(prepared.impossible, SizeIs(1));
 }
 
@@ -134,7 +145,7 @@ TEST(PreparePAMTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     auto const provider = PlaceholderEntries();
     int carried = 0;
     for (int i = 0; i < 1500; ++i) {
-        std::string text;
+        std::string text = usual;
         for (auto lines = 1 + random() % 5; lines > 0; --lines) {
             text += RandomEntry(random) + "\n";
         }

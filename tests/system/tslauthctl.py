@@ -1,0 +1,87 @@
+# SPDX-License-Identifier: Apache-2.0
+"""What the tests of the tool share. They run as root inside a node."""
+
+import functools
+import json
+import os
+import pathlib
+import subprocess
+import sys
+import unittest
+
+import jsonschema
+
+TOOL = os.environ["TSLAUTHCTL"]
+SCHEMA = json.loads(
+    (pathlib.Path(__file__).parents[2] / "docs" / "tslauthctl.schema.json").read_text())
+
+PAM = pathlib.Path("/etc/pam.d/system-auth-generic")
+NSS = pathlib.Path("/etc/nsswitch.conf")
+RECORD = pathlib.Path("/etc/tessel/tslauth/authentication.conf")
+PROVIDER = pathlib.Path("/etc/tessel/tslauth/provider.conf")
+LOCK = pathlib.Path("/run/lock/tslauthctl.lock")
+FILES = (PAM, NSS, RECORD)
+
+AD = "Active Directory"
+
+DONE, FAILURE, USAGE, NOT_ROOT, REFUSED, LOSS, DRIFT, CHANGES = range(8)
+
+PLAIN_PAM = """#%PAM-1.0
+auth required /lib/security/$ISA/pam_access.so
+auth sufficient /lib/security/$ISA/pam_unix.so
+account required /lib/security/$ISA/pam_unix.so
+session required /lib/security/$ISA/pam_permit.so
+"""
+PLAIN_NSS = "passwd: files\ngroup: files\nshadow: files\nhosts: files\n"
+
+
+@functools.cache
+def validator():
+    jsonschema.Draft202012Validator.check_schema(SCHEMA)
+    return jsonschema.Draft202012Validator(SCHEMA)
+
+
+def run(*arguments, **options):
+    """The finished process of the tool, with its output as bytes."""
+    return subprocess.run([TOOL, *arguments], stdout=options.pop("stdout", subprocess.PIPE),
+                          stderr=subprocess.PIPE, timeout=60, **options)
+
+
+def ask(*arguments, **options):
+    """The JSON document, which is valid and says the exit code of the process."""
+    process = run(*arguments, "--json", **options)
+    document = json.loads(process.stdout)
+    validator().validate(document)
+    assert document["exit"] == process.returncode, process
+    assert process.stderr == b"", process.stderr
+    return document
+
+
+def set_up(pam=PLAIN_PAM, nss=PLAIN_NSS, store="None", provider="example"):
+    PAM.write_bytes(pam if isinstance(pam, bytes) else pam.encode())
+    NSS.write_bytes(nss if isinstance(nss, bytes) else nss.encode())
+    RECORD.write_text(f'remote-authentication-store = "{store}"\n')
+    PROVIDER.write_text(f'provider = "{provider}"\n')
+    for path in FILES:
+        os.chown(path, 0, 0)
+        os.chmod(path, 0o644)
+
+
+def state(paths=FILES):
+    """Everything about the files that a change would change."""
+    found = {}
+    for path in paths:
+        status = path.stat()
+        found[path] = (path.read_bytes(), status.st_ino, status.st_mtime_ns, status.st_mode,
+                       status.st_uid, status.st_gid)
+    return found
+
+
+def texts():
+    return {str(path): path.read_bytes() for path in FILES}
+
+
+def main():
+    if os.environ.get("TSLAUTH_NODE") != "1":
+        sys.exit("to be run inside a node: tools/node")
+    unittest.main(module="__main__", verbosity=0)

@@ -1,0 +1,403 @@
+#!/usr/bin/python3 -B
+# SPDX-License-Identifier: Apache-2.0
+"""The commands of tslauthctl on the fixed paths: what they say, what they change, how they end."""
+
+import glob
+import os
+import pathlib
+import re
+import subprocess
+import tempfile
+import unittest
+
+from tslauthctl import *
+
+STOCK_NSS = """# /etc/nsswitch.conf
+#
+# Example configuration of GNU Name Service Switch functionality.
+# If you have the `glibc-doc-reference' and `info' packages installed, try:
+# `info libc "Name Service Switch"' for information about this file.
+
+passwd:         files
+group:          files
+shadow:         files
+gshadow:        files
+
+hosts:          files mdns4_minimal [NOTFOUND=return] dns
+networks:       files
+
+protocols:      db files
+services:       db files
+ethers:         db files
+rpc:            db files
+
+netgroup:       nis
+"""
+
+STOCK_PAM = """#
+# A policy as Debian's are.
+auth       optional   pam_faildelay.so  delay=3000000
+auth [success=ok new_authtok_reqd=ok ignore=ignore user_unknown=bad default=die] pam_securetty.so
+@include common-auth
+-session   optional   pam_systemd.so
+session    required   pam_env.so \\
+           readenv=1 envfile=/etc/default/locale
+@include common-account
+@include common-session
+@include common-password
+"""
+
+
+def nobody():
+    os.setgroups([])
+    os.setgid(65534)
+    os.setuid(65534)
+
+
+class Case(unittest.TestCase):
+    def setUp(self):
+        set_up()
+        for path in glob.glob("/etc/*.tslauth-orig*") + glob.glob("/etc/pam.d/*.tslauth-orig*"):
+            os.unlink(path)
+
+    def unchanged(self, *arguments, **options):
+        """Runs the tool and makes sure that it leaves no trace."""
+        before = state()
+        names = sorted(os.listdir("/etc") + os.listdir("/etc/pam.d"))
+        document = ask(*arguments, **options)
+        self.assertEqual(before, state())
+        self.assertEqual(names, sorted(os.listdir("/etc") + os.listdir("/etc/pam.d")))
+        return document
+
+
+class Stores(Case):
+    def test_the_active_one_is_marked(self):
+        self.assertEqual([{"name": AD, "active": False}, {"name": "None", "active": True}],
+                         ask("stores")["stores"])
+        self.assertEqual(b"  Active Directory\n* None\n", run("stores").stdout)
+
+    def test_they_are_listed_without_a_record(self):
+        RECORD.unlink()
+        document = ask("stores")
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertIsNone(document["recorded"])
+        self.assertEqual("tessel::authentication::IOError", document["error"]["exception"])
+        self.assertEqual(2, len(document["stores"]))
+
+
+class Plan(Case):
+    def test_it_is_what_activate_writes(self):
+        for store in (AD, "None"):
+            document = self.unchanged("plan", store)
+            self.assertEqual(CHANGES, document["exit"])
+            expected = texts()
+            for file in document["files"]:
+                with tempfile.NamedTemporaryFile() as copy:
+                    copy.write(expected[file["path"]])
+                    copy.flush()
+                    subprocess.run(["patch", "-s", copy.name], input=file["diff"].encode(),
+                                   check=True, timeout=60)
+                    expected[file["path"]] = pathlib.Path(copy.name).read_bytes()
+            activated = ask("activate", store)
+            self.assertEqual(DONE, activated["exit"])
+            self.assertEqual([file["path"] for file in document["files"]], activated["changed"])
+            self.assertEqual(expected, texts())
+            again = self.unchanged("plan", store)
+            self.assertEqual(DONE, again["exit"])
+
+    def test_the_files_come_in_the_order_of_writing(self):
+        paths = [file["path"] for file in ask("plan", AD)["files"]]
+        self.assertEqual([str(PAM), str(NSS), str(RECORD)], paths)
+        ask("activate", AD)
+        paths = [file["path"] for file in ask("plan", "None")["files"]]
+        self.assertEqual([str(RECORD), str(PAM), str(NSS)], paths)
+
+    def test_it_needs_no_root(self):
+        self.assertEqual(CHANGES, self.unchanged("plan", AD, preexec_fn=nobody)["exit"])
+
+    def test_every_loss_is_named(self):
+        set_up(nss="passwd: files\ngroup: files\nhosts: files [NOTFOUND=return] dns\n",
+               pam="# one\nauth [success=2 default=ignore] u.so\n"
+                   "auth required /lib/security/$ISA/pam_access.so\nauth required b.so [x  y]\n"
+                   "auth required c.so\n")
+        losses = {file["path"]: file["losses"] for file in ask("plan", AD)["files"]}
+        self.assertIn("account: the policy 'other', which decides where there is no entry, would "
+                      "no longer", losses[str(PAM)])
+        PAM.write_text(PAM.read_text() + "account required c.so\n")
+        document = self.unchanged("plan", AD)
+        self.assertEqual(LOSS, document["exit"])
+        losses = {file["path"]: file["losses"] for file in document["files"]}
+        self.assertEqual(["hosts: service 'dns' would be lost",
+                          "shadow: the default 'files', which holds without a line, would be lost"],
+                         losses[str(NSS)])
+        self.assertEqual(["auth: entry 'required b.so [x  y]' would become 'required b.so [x y]'"],
+                         losses[str(PAM)])
+        notes = [note for file in document["files"] for note in file["notes"]]
+        self.assertEqual(["1 comment would be dropped, which mean nothing to the system"], notes)
+
+    def test_a_refusal_of_a_reader_is_told(self):
+        set_up(nss=PLAIN_NSS + "gshadow: files\n")
+        document = self.unchanged("plan", AD)
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertEqual({"message": "Invalid Database: gshadow", "afterwards": False,
+                          "exception": "SystemConfiguration::InvalidDatabaseException"},
+                         document["refusal"])
+
+    def test_an_unknown_recorded_store_is_refused_after_the_record(self):
+        set_up(store="Example Store")
+        document = self.unchanged("plan", "None")
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertTrue(document["refusal"]["afterwards"])
+        self.assertEqual([str(RECORD)], [file["path"] for file in document["files"]])
+
+    def test_control_characters_are_escaped(self):
+        set_up(nss=PLAIN_NSS + "rpc: \x1b]0;title\x07\n")
+        process = run("plan", AD, "--color=never")
+        self.assertIn(b" rpc: \\x1b]0;title\\x07\n", process.stdout)
+        self.assertNotIn(b"\x1b", process.stdout)
+        self.assertIn("\x1b]0;title\x07", ask("plan", AD)["files"][1]["diff"])
+
+    def test_colours_are_for_terminals_and_on_demand(self):
+        self.assertNotIn(b"\x1b[", run("plan", AD).stdout)
+        self.assertIn(b"\x1b[32m+", run("plan", AD, "--color=always").stdout)
+        self.assertIn(b"\x1b[32m+", self.on_a_terminal({}))
+        self.assertNotIn(b"\x1b[", self.on_a_terminal({"NO_COLOR": "1"}))
+        self.assertNotIn(b"\x1b[", self.on_a_terminal({"TERM": "dumb"}))
+
+    def on_a_terminal(self, variables):
+        environment = {"PATH": os.environ["PATH"], "TERM": "xterm", **variables}
+        master, slave = os.openpty()
+        process = subprocess.Popen([TOOL, "plan", AD], stdout=slave, stderr=slave, stdin=slave,
+                                   env=environment)
+        os.close(slave)
+        output = b""
+        try:
+            while data := os.read(master, 65536):
+                output += data
+        except OSError:
+            pass  # how the end of a pseudo-terminal shows
+        os.close(master)
+        self.assertEqual(CHANGES, process.wait(timeout=60))
+        return output
+
+
+class Activate(Case):
+    def test_a_file_with_a_loss_is_left_alone_unless_it_is_accepted(self):
+        set_up(nss=PLAIN_NSS.replace("hosts: files", "hosts: files [NOTFOUND=return] dns"))
+        document = self.unchanged("activate", AD)
+        self.assertEqual(LOSS, document["exit"])
+        self.assertEqual([{"path": str(NSS), "loss": "hosts: service 'dns' would be lost"}],
+                         document["losses"])
+        process = run("activate", AD)
+        self.assertIn(b"hosts: service 'dns' would be lost", process.stderr)
+        self.assertEqual(DONE, ask("activate", AD, "--accept-loss")["exit"])
+        self.assertIn("hosts: files [NOTFOUND=return]\n", NSS.read_text())
+
+    def test_what_would_be_lost_on_the_way_back_counts(self):
+        set_up(nss=PLAIN_NSS.replace("passwd: files", "passwd: files [NOTFOUND=return]"))
+        self.assertEqual(["passwd: service 'files [NOTFOUND=return]' would be lost (when the store "
+                          "is left again)"],
+                         [loss["loss"] for loss in self.unchanged("activate", AD)["losses"]])
+
+    def test_a_second_refusal_does_not_leave_half_of_it(self):
+        set_up(nss=PLAIN_NSS + "odd: files\n")
+        for arguments in (("activate", AD), ("activate", AD, "--accept-loss")):
+            document = self.unchanged(*arguments)
+            self.assertEqual(REFUSED, document["exit"])
+            self.assertEqual("SystemConfiguration::InvalidDatabaseException",
+                             document["error"]["exception"])
+
+    def test_an_unknown_recorded_store_is_left_with_its_refusal(self):
+        set_up(store="Example Store")
+        document = ask("activate", "None")
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertEqual("The specified store 'Example Store' is unknown",
+                         document["error"]["message"])
+        self.assertEqual([str(RECORD)], document["changed"])
+        self.assertEqual(DONE, ask("activate", "None")["exit"])
+
+    def test_none_is_not_recorded_over_entries_that_would_stay(self):
+        ask("activate", AD)
+        PROVIDER.write_text('provider = "gone"\n')
+        self.assertEqual(REFUSED, self.unchanged("activate", "None")["exit"])
+        document = ask("activate", "None", "--accept-loss")
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertEqual([str(RECORD)], document["changed"])
+        self.assertIn("None", RECORD.read_text())
+
+    def test_a_failure_in_the_middle_names_what_was_changed(self):
+        # The folder of the record takes no new file; those of the others do.
+        subprocess.run(["mount", "--bind", RECORD.parent, RECORD.parent], check=True)
+        subprocess.run(["mount", "-o", "remount,bind,ro", RECORD.parent], check=True)
+        try:
+            document = ask("activate", AD)
+        finally:
+            subprocess.run(["umount", RECORD.parent], check=True)
+        self.assertEqual(REFUSED, document["exit"])
+        self.assertEqual("tessel::authentication::IOError", document["error"]["exception"])
+        self.assertEqual([str(PAM), str(NSS)], document["changed"])
+        self.assertEqual(DRIFT, ask("status")["exit"])
+
+    def test_it_wants_root(self):
+        document = self.unchanged("activate", AD, preexec_fn=nobody)
+        self.assertEqual(NOT_ROOT, document["exit"])
+
+    def test_the_lock_must_be_roots_own_file(self):
+        LOCK.unlink(missing_ok=True)
+        for make in (lambda: LOCK.symlink_to("/etc/target"), LOCK.mkdir,
+                     lambda: (LOCK.touch(), os.chown(LOCK, 65534, 65534))):
+            make()
+            self.assertEqual(FAILURE, self.unchanged("activate", AD)["exit"])
+            LOCK.rmdir() if LOCK.is_dir() else LOCK.unlink()
+        self.assertFalse(pathlib.Path("/etc/target").exists())
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+        self.assertEqual(0o600, LOCK.stat().st_mode & 0o7777)
+
+    def test_the_folder_of_the_lock_is_made(self):
+        LOCK.unlink(missing_ok=True)
+        LOCK.parent.rmdir()
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+
+
+class Prepare(Case):
+    def test_a_stock_debian_host_goes_all_the_way(self):
+        set_up(pam=STOCK_PAM, nss=STOCK_NSS)
+        self.assertEqual(REFUSED, self.unchanged("activate", AD)["exit"])
+        shown = self.unchanged("prepare")
+        self.assertEqual(CHANGES, shown["exit"], shown)
+        os.chown(NSS, 12, 34)
+        os.chmod(NSS, 0o640)
+        original = state()
+        written = ask("prepare", "--write")
+        self.assertEqual(DONE, written["exit"])
+        for file, path in zip(written["files"], (PAM, NSS)):
+            kept = pathlib.Path(file["original"])
+            self.assertEqual(f"{path}.tslauth-orig", str(kept))
+            self.assertEqual(original[path], state([kept])[kept])
+        status = NSS.stat()
+        self.assertEqual((12, 34, 0o640), (status.st_uid, status.st_gid, status.st_mode & 0o7777))
+        self.assertIn("\nhosts: files[SUCCESS=return]mdns4_minimal[NOTFOUND=return] dns\n",
+                      NSS.read_text())
+        self.assertEqual(DONE, self.unchanged("prepare")["exit"])
+        for store in (AD, "None"):
+            self.assertEqual(CHANGES, self.unchanged("plan", store)["exit"])
+            self.assertEqual(DONE, ask("activate", store)["exit"])
+            self.assertEqual(DONE, ask("status")["exit"])
+
+    def test_the_original_of_a_second_time_gets_a_number(self):
+        for kept in ("", ".1", ".2"):
+            set_up(nss=PLAIN_NSS + "gshadow: files\n")
+            document = ask("prepare", "--write")
+            self.assertEqual(f"{NSS}.tslauth-orig{kept}", document["files"][1]["original"])
+            self.assertIsNone(document["files"][0]["original"])
+
+    def test_where_no_edit_exists_nothing_is_written_unless_accepted(self):
+        set_up(nss=PLAIN_NSS + "gshadow: files systemd\nrpc : files\n")
+        self.assertEqual(LOSS, self.unchanged("prepare")["exit"])
+        document = self.unchanged("prepare", "--write")
+        self.assertEqual(LOSS, document["exit"])
+        self.assertFalse(document["written"])
+        self.assertEqual([5], [line["line"] for line in document["files"][1]["impossible"]])
+        self.assertEqual(DONE, ask("prepare", "--write", "--accept-loss")["exit"])
+        self.assertEqual(PLAIN_NSS + "rpc: files\n", NSS.read_text())
+
+    def test_without_a_provider_one_is_assumed(self):
+        PROVIDER.unlink()
+        self.assertEqual(DONE, self.unchanged("prepare")["exit"])
+
+    def test_writing_wants_root(self):
+        set_up(nss=PLAIN_NSS + "gshadow: files\n")
+        self.assertEqual(NOT_ROOT, self.unchanged("prepare", "--write", preexec_fn=nobody)["exit"])
+        self.assertEqual(CHANGES, self.unchanged("prepare", preexec_fn=nobody)["exit"])
+
+
+class Status(Case):
+    def parts(self, document):
+        return {part["name"]: part["state"] for file in document["files"] for part in file["parts"]}
+
+    def test_in_step(self):
+        document = self.unchanged("status")
+        self.assertEqual((DONE, "None", True),
+                         (document["exit"], document["recorded"], document["known"]))
+        self.assertEqual("example", document["provider"]["name"])
+        ask("activate", AD)
+        document = self.unchanged("status")
+        self.assertEqual(DONE, document["exit"])
+        self.assertEqual({"in-step"}, set(self.parts(document).values()))
+
+    def test_drift_is_told_by_facility_and_database(self):
+        ask("activate", AD)
+        lines = PAM.read_text().splitlines(keepends=True)
+        PAM.write_text("".join(line for line in lines
+                               if not re.match("auth.*(pwdfile|example)", line)))
+        NSS.write_text(PLAIN_NSS)
+        document = self.unchanged("status")
+        self.assertEqual(DRIFT, document["exit"])
+        self.assertEqual(["partly", "not-at-all"], [file["state"] for file in document["files"]])
+        self.assertEqual({"auth": "not-at-all", "account": "in-step", "passwd": "not-at-all",
+                          "group": "not-at-all", "shadow": "not-at-all"}, self.parts(document))
+
+    def test_entries_left_behind_are_drift(self):
+        ask("activate", AD)
+        RECORD.write_text('remote-authentication-store = "None"\n')
+        self.assertEqual(DRIFT, self.unchanged("status")["exit"])
+
+    def test_an_unknown_store_is_drift(self):
+        set_up(store="Example Store")
+        document = self.unchanged("status")
+        self.assertEqual((DRIFT, False), (document["exit"], document["known"]))
+
+    def test_without_its_provider_it_cannot_be_told(self):
+        for store, code in ((AD, REFUSED), ("None", DONE)):
+            set_up(store=store, provider="gone")
+            document = self.unchanged("status")
+            self.assertEqual(code, document["exit"])
+            self.assertFalse(document["provider"]["loaded"])
+            self.assertIsNotNone(document["provider"]["error"]["exception"])
+            self.assertEqual({"unknown"}, set(self.parts(document).values()))
+
+    def test_a_missing_file_cannot_be_told(self):
+        NSS.unlink()
+        document = ask("status")
+        self.assertEqual(FAILURE, document["exit"])
+        self.assertEqual(f"Cannot open '{NSS}': No such file or directory",
+                         document["files"][1]["error"])
+
+    def test_a_missing_record_is_refused(self):
+        RECORD.write_text("x = 1\n")
+        document = self.unchanged("status")
+        self.assertEqual((REFUSED, "tessel::authentication::InvalidKeyException"),
+                         (document["exit"], document["error"]["exception"]))
+
+
+class Usage(Case):
+    def test_it_is_told_what_is_wrong(self):
+        for arguments in ((), ("plan",), ("plan", "a", "b"), ("nothing",), ("status", "--odd"),
+                          ("activate",), ("stores", "--color=sometimes")):
+            document = self.unchanged(*arguments)
+            self.assertEqual(USAGE, document["exit"], arguments)
+            process = run(*arguments)
+            self.assertEqual(USAGE, process.returncode)
+            self.assertEqual(b"", process.stdout)
+            self.assertTrue(process.stderr.startswith(b"tslauthctl: "), process.stderr)
+
+    def test_an_unknown_store_is_answered_with_the_known_ones(self):
+        for command in ("plan", "activate"):
+            self.assertEqual("Unknown store 'none'. Known are: 'Active Directory', 'None'",
+                             self.unchanged(command, "none")["error"]["message"])
+
+    def test_help_and_version_succeed(self):
+        self.assertRegex(run("--version").stdout, rb"^tslauthctl \d+\.\d+\.\d+\n$")
+        for command in ([], ["stores"], ["status"], ["plan"], ["activate"], ["prepare"]):
+            process = run(*command, "--help")
+            self.assertEqual(DONE, process.returncode)
+            for code in range(8):
+                self.assertIn(f"\n  {code}  ".encode(), process.stdout)
+
+    def test_output_that_cannot_be_written_is_a_failure(self):
+        for arguments in (("stores",), ("plan", AD), ("status", "--json"), ("--help",)):
+            with open("/dev/full", "wb") as full:
+                self.assertEqual(FAILURE, run(*arguments, stdout=full).returncode, arguments)
+
+
+main()
