@@ -16,6 +16,7 @@ typedef struct CAMRecording {
     /* Set by the test. Results are handed out also where `code` says failure. */
     int code;             /* of every entry, while `failingCall` is 0 */
     unsigned failingCall; /* the only call that returns `code`, counted from 1 */
+    int numbered;         /* instead of the next three, the call's number, counted from 1 */
     char* netBIOSDomainName;
     char* dnsDomainName;
     char* domainSID;

@@ -42,6 +42,11 @@ static int GetDomainInformation(char const* server, int verifyCertificate, char 
     Text(thumbprint);
     camRecording.slotsWereNull =
         *netBIOSDomainName == NULL && *dnsDomainName == NULL && *domainSID == NULL;
+    if (camRecording.numbered) {
+        static char numbers[][2] = {"1", "2", "3", "4", "5", "6", "7", "8", "9"};
+        *netBIOSDomainName = *dnsDomainName = *domainSID = numbers[camRecording.calls % 9];
+        return End();
+    }
     *netBIOSDomainName = camRecording.netBIOSDomainName;
     *dnsDomainName = camRecording.dnsDomainName;
     *domainSID = camRecording.domainSID;
