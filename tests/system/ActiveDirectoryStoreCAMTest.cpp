@@ -1,18 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Failure.h"
 #include "JoinableHost.h"
-#include "LoadedProvider.h"
 #include "providers/CAMRecording.h"
-#include "providers/Recording.h"
 
 #include <strandctl/HostCtlException.h>
-#include <tslauth/ActiveDirectoryStore.h>
 #include <tslauth/Exceptions.h>
 
 #include <gmock/gmock.h>
 
 #include <fcntl.h>
-#include <memory>
 #include <sys/inotify.h>
 
 using namespace tessel::authentication;
@@ -113,13 +109,10 @@ class ActiveDirectoryStoreCAMTest : public Host::JoinTest {
 protected:
     void SetUp() override {
         JoinTest::SetUp();
-        Host::Write(Paths::ProviderConfiguration, "provider = \"recording\"\n");
         Host::Write(Paths::CAMProviderConfiguration, "provider = \"cam-recording\"\n");
         Host::Write(Paths::CAMThumbprintStore, "192.0.2.20 = \"0A:1B\"\n");
         Host::Write(AdvancedOptions, Option("1"));
-        _library = std::make_unique<LoadedProvider>("recording");
         _camLibrary = std::make_unique<LoadedProvider>("cam-recording");
-        _store = std::make_unique<ActiveDirectoryStore>(60);
         CAM().netBIOSDomainName = _texts[0];
         CAM().dnsDomainName = _texts[1];
         CAM().domainSID = _texts[2];
@@ -129,18 +122,10 @@ protected:
 
     void TearDown() override {
         permissionsAreRefused = false;
-        _store.reset();
         _camLibrary.reset();
-        _library.reset();
         JoinTest::TearDown();
     }
 
-    ActiveDirectoryStore& Store() {
-        return *_store;
-    }
-    Recording& Record() {
-        return _library->Find<Recording>("recording");
-    }
     CAMRecording& CAM() {
         return _camLibrary->Find<CAMRecording>("camRecording");
     }
@@ -169,15 +154,8 @@ protected:
     }
 
     /// What the provider's join with a machine account was called with, or that it was not called.
-    std::vector<std::string> Joined() {
-        if (Record().calls[13] != 1) {
-            return {"called " + std::to_string(Record().calls[13]) + " times"};
-        }
-        std::vector<std::string> arguments;
-        for (unsigned i = 0; i < Record().argumentCount; ++i) {
-            arguments.push_back(Record().isNull[i] != 0 ? "(null)" : Record().arguments[i]);
-        }
-        return arguments;
+    std::vector<std::string> Joined() const {
+        return ArgumentsOf(13);
     }
 
     /// Makes a certificate, and tells its thumbprint as the openssl program prints it.
@@ -193,9 +171,7 @@ protected:
 
 private:
     char _texts[5][16] = {"CORP", "corp.example", "S-1-5-21", "first", "second"};
-    std::unique_ptr<LoadedProvider> _library;
     std::unique_ptr<LoadedProvider> _camLibrary;
-    std::unique_ptr<ActiveDirectoryStore> _store;
 };
 
 // ---- The server's address -----------------------------------------------------------------------

@@ -1,17 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Failure.h"
 #include "JoinableHost.h"
-#include "LoadedProvider.h"
-#include "providers/Recording.h"
 
 #include <strandctl/HostCtlException.h>
-#include <tslauth/ActiveDirectoryStore.h>
 #include <tslauth/Exceptions.h>
 
 #include <gmock/gmock.h>
 
 #include <locale>
-#include <memory>
 
 using namespace tessel::authentication;
 using testing::ElementsAre;
@@ -38,27 +34,6 @@ constexpr char NotSearching[] = "nameserver 127.0.0.1\n";
 
 class ActiveDirectoryStoreJoinTest : public Host::JoinTest {
 protected:
-    void SetUp() override {
-        JoinTest::SetUp();
-        Host::Write(Paths::ProviderConfiguration, "provider = \"recording\"\n");
-        _library = std::make_unique<LoadedProvider>("recording");
-        _store = std::make_unique<ActiveDirectoryStore>(60);
-    }
-
-    void TearDown() override {
-        _store.reset();
-        _library.reset();
-        JoinTest::TearDown();
-    }
-
-    ActiveDirectoryStore& Store() {
-        return *_store;
-    }
-
-    Recording& Record() {
-        return _library->Find<Recording>("recording");
-    }
-
     void Join(std::string const& domain = "corp.example") {
         Store().JoinDomain(domain, {"joiner", "secret"}, false);
     }
@@ -68,24 +43,9 @@ protected:
     }
 
     /// What the provider's join was called with, or that it was not called.
-    std::vector<std::string> Joined() {
-        if (Record().calls[2] != 1) {
-            return {"called " + std::to_string(Record().calls[2]) + " times"};
-        }
-        return Arguments();
+    std::vector<std::string> Joined() const {
+        return ArgumentsOf(2);
     }
-
-    std::vector<std::string> Arguments() {
-        std::vector<std::string> arguments;
-        for (unsigned i = 0; i < Record().argumentCount; ++i) {
-            arguments.push_back(Record().isNull[i] != 0 ? "(null)" : Record().arguments[i]);
-        }
-        return arguments;
-    }
-
-private:
-    std::unique_ptr<LoadedProvider> _library;
-    std::unique_ptr<ActiveDirectoryStore> _store;
 };
 
 // ---- The arguments ------------------------------------------------------------------------------

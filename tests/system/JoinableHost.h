@@ -3,11 +3,16 @@
 #define TESTS_SYSTEM_JOINABLEHOST_H
 
 #include "Host.h"
+#include "LoadedProvider.h"
+#include "providers/Recording.h"
+
+#include <tslauth/ActiveDirectoryStore.h>
 
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <string>
 #include <syslog.h>
 #include <unistd.h>
@@ -42,7 +47,8 @@ constexpr char Hosts[] = "/etc/hosts";
 constexpr char ResolvConf[] = "/etc/resolv.conf";
 
 /// A host that can be joined to "corp.example": it has a name that resolves, a management interface
-/// with an address and the default route, and files of which every byte is known.
+/// with an address and the default route, and files of which every byte is known. Its store's
+/// provider writes down what reaches it.
 class JoinTest : public Test {
 protected:
     static constexpr char const* Address = "192.0.2.10";
@@ -62,11 +68,37 @@ protected:
             "ip link add management type veth");
         Run("ip address add 192.0.2.10/24 dev management && ip link set management up && "
             "ip route add default via 192.0.2.1");
+        Write(Paths::ProviderConfiguration, "provider = \"recording\"\n");
+        _library = std::make_unique<LoadedProvider>("recording");
+        _store = std::make_unique<tessel::authentication::ActiveDirectoryStore>(60);
     }
 
     void TearDown() override {
+        _store.reset();
+        _library.reset();
         Run("ip link delete management");
         Test::TearDown();
+    }
+
+    tessel::authentication::ActiveDirectoryStore& Store() const {
+        return *_store;
+    }
+
+    Recording& Record() const {
+        return _library->Find<Recording>("recording");
+    }
+
+    /// What the only call of the provider's entry `number` was called with; a null text shows as
+    /// "(null)".
+    std::vector<std::string> ArgumentsOf(unsigned number) const {
+        if (Record().calls[number] != 1) {
+            return {"called " + std::to_string(Record().calls[number]) + " times"};
+        }
+        std::vector<std::string> arguments;
+        for (unsigned i = 0; i < Record().argumentCount; ++i) {
+            arguments.push_back(Record().isNull[i] != 0 ? "(null)" : Record().arguments[i]);
+        }
+        return arguments;
     }
 
     static void Run(std::string const& command) {
@@ -104,6 +136,10 @@ protected:
     static std::string NameFiles() {
         return Read(Hosts) + "----\n" + Read(ResolvConf);
     }
+
+private:
+    std::unique_ptr<LoadedProvider> _library;
+    std::unique_ptr<tessel::authentication::ActiveDirectoryStore> _store;
 };
 
 } // namespace Host
