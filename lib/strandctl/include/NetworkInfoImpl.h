@@ -13,7 +13,8 @@ namespace Network {
 class STRANDCTL_EXPORT NetworkInfoImpl {
 public:
     NetworkInfoImpl();
-    ~NetworkInfoImpl();
+    // Out of line: another host's library of this name may keep something in here.
+    ~NetworkInfoImpl(); // NOLINT(performance-trivially-destructible)
     NetworkInfoImpl(NetworkInfoImpl const&) = delete;
     NetworkInfoImpl& operator=(NetworkInfoImpl const&) = delete;
 
