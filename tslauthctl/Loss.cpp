@@ -57,22 +57,29 @@ void Compare(std::string const& where, std::string const& kind, std::string cons
     if (SameTexts(before, after)) {
         return;
     }
+    std::string const subject = where + ": " + kind + " '";
     auto added = Missing(after, before);
     auto const lost = Missing(before, after);
     for (auto const& item : lost) {
         auto const altered = std::find_if(added.begin(), added.end(),
                                           [&](Item const& other) { return other.key == item.key; });
-        std::string loss = where + ": " + kind + " '" + item.text + "' would ";
+        std::string loss = subject;
+        loss += item.text;
         if (altered != added.end()) {
-            loss += "become '" + altered->text + "'";
+            loss += "' would become '";
+            loss += altered->text;
+            loss += "'";
             added.erase(altered);
         } else {
-            loss += "be lost";
+            loss += "' would be lost";
         }
         losses.push_back(std::move(loss));
     }
     for (auto const& item : added) {
-        losses.push_back(where + ": " + kind + " '" + item.text + "' would be added");
+        std::string addition = subject;
+        addition += item.text;
+        addition += "' would be added";
+        losses.push_back(std::move(addition));
     }
     if (lost.empty() && added.empty()) {
         losses.push_back(where + ": the order of the " + kinds + " would change");

@@ -67,6 +67,12 @@ std::string Place(std::string const& path, PreparedLine const& line) {
     return line.number > 0 ? path + ":" + std::to_string(line.number) : path;
 }
 
+/// Enough of a line to know it by.
+std::string Shortened(std::string const& line) {
+    constexpr std::size_t most = 100;
+    return line.size() > most ? line.substr(0, most) + "..." : line;
+}
+
 /// What is to become of one file.
 struct PreparedFile {
     std::string path;
@@ -86,8 +92,8 @@ void Describe(PreparedFile const& file, bool write, Output& output) {
     }
     for (auto const& finding : file.prepared.impossible) {
         output.Warning(Place(file.path, finding) + ": no lossless edit exists" +
-                       (finding.before.empty() ? "" : " for '" + finding.before + "'") + ": " +
-                       finding.reason);
+                       (finding.before.empty() ? "" : " for '" + Shortened(finding.before) + "'") +
+                       ": " + finding.reason);
     }
     nlohmann::json original = nullptr;
     if (write && file.Changes()) {

@@ -25,7 +25,7 @@ namespace tessel::tslauthctl {
 namespace {
 
 constexpr std::size_t context = 3;
-constexpr std::size_t mostDiffering = 4000;
+constexpr std::size_t mostDiffering = 2000;
 
 struct Step {
     char sign;

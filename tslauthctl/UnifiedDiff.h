@@ -10,7 +10,7 @@ namespace tessel::tslauthctl {
 /// The difference of two texts in the unified format that patch(1) takes, with three lines around
 /// each change. Empty for equal texts.
 ///
-/// Where more than some thousand lines differ, the shortest difference is not looked for: its cost
+/// Where more than two thousand lines differ, the shortest difference is not looked for: its cost
 /// grows with the square, and all of them are shown as replaced.
 std::string UnifiedDiff(std::string const& path, std::string_view before, std::string_view after);
 

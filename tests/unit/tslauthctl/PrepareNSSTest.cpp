@@ -156,6 +156,21 @@ std::string RandomLine(std::mt19937& random) {
     return line + pick({"", "", "", " ", "\t", "\r", "  "});
 }
 
+TEST(PrepareNSSTest, AnyBytesArePreparedOrGivenUp) {
+    std::mt19937 random(5);
+    constexpr char bytes[] = " \t\n\r\v:#[]!=\0\xff\x80passwdhostsfilesSUCCESS=return";
+    for (int i = 0; i < 3000; ++i) {
+        std::string text;
+        for (auto size = random() % 60; size > 0; --size) {
+            text += bytes[random() % sizeof bytes];
+        }
+        auto const prepared = PrepareNSS(text, PlaceholderEntries(), i % 2 == 0);
+        if (prepared.impossible.empty()) {
+            ASSERT_THAT(PrepareNSS(prepared.text, PlaceholderEntries(), false).edits, IsEmpty());
+        }
+    }
+}
+
 TEST(PrepareNSSTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(7);
     auto const provider = PlaceholderEntries();

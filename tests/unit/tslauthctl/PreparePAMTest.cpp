@@ -140,6 +140,46 @@ std::vector<std::string> Expanded(std::string const& text) {
     return entries;
 }
 
+TEST(PreparePAMTest, AnyBytesArePreparedOrGivenUp) {
+    std::mt19937 random(5);
+    std::string const words[] = {" ",
+                                 "\t",
+                                 "\n",
+                                 "\n",
+                                 "\\\n",
+                                 "[",
+                                 "]",
+                                 "\\]",
+                                 "#",
+                                 "-",
+                                 "auth",
+                                 "account",
+                                 "required",
+                                 "include",
+                                 "@include",
+                                 "login",
+                                 "\r",
+                                 "\v",
+                                 "\xff",
+                                 std::string(1, '\0'),
+                                 "success=1",
+                                 "=",
+                                 std::string(1000, 'x')};
+    for (int i = 0; i < 3000; ++i) {
+        std::string text = usual;
+        for (auto size = random() % 40; size > 0; --size) {
+            text += words[random() % std::size(words)];
+        }
+        auto const prepared = PreparePAM(text, PlaceholderEntries(), ReadTestPolicy, i % 2 == 0);
+        if (prepared.impossible.empty()) {
+            ASSERT_THAT(
+                PreparePAM(prepared.text, PlaceholderEntries(), ReadTestPolicy, false).edits,
+                IsEmpty())
+                << text;
+        }
+    }
+}
+
 TEST(PreparePAMTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(11);
     auto const provider = PlaceholderEntries();
