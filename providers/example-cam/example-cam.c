@@ -53,7 +53,7 @@ static bool IsPinned(X509 const* certificate, char const* thumbprint) {
     if (X509_digest(certificate, EVP_sha1(), digest, &size) <= 0 || size != DIGEST) {
         return false;
     }
-    for (unsigned i = 0; i < DIGEST; ++i) {
+    for (size_t i = 0; i < DIGEST; ++i) {
         /* Three characters fit: the last one's colon is cut off below. */
         (void)snprintf(text + 3 * i, sizeof text - 3 * i, "%02X:", digest[i]);
     }
@@ -128,7 +128,7 @@ static int AddAccount(FILE* file, char const* name, bool endsLine) {
     if (RAND_bytes(bytes, sizeof bytes) != 1) {
         return INTERNAL_ERROR;
     }
-    for (unsigned i = 0; i < SECRET; ++i) {
+    for (size_t i = 0; i < SECRET; ++i) {
         (void)snprintf(secretText + 2 * i, 3, "%02x", bytes[i]); /* it always fits */
     }
     OPENSSL_cleanse(bytes, sizeof bytes);
