@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/HostsFile.h>
 
+#include "../HostCtlFailure.h"
 #include "../TemporaryFolder.h"
-#include "../unit/strandctl/Failure.h"
 #include "Node.h"
 
 #include <algorithm>
@@ -84,12 +84,13 @@ TEST_F(HostsFileTest, TheResolverAnswersTheEntryAlone) {
 }
 
 TEST_F(HostsFileTest, ItsModeAndOwnerAreKept) {
-    std::filesystem::permissions(path, std::filesystem::perms(0640));
     ASSERT_EQ(0, chown(path, 123, 456));
+    // Two bits that a change of the owner clears.
+    ASSERT_EQ(0, chmod(path, 06750));
     Add();
     struct stat status = {};
     ASSERT_EQ(0, stat(path, &status));
-    EXPECT_EQ(0640U, status.st_mode & 07777U);
+    EXPECT_EQ(06750U, status.st_mode & 07777U);
     EXPECT_EQ(123U, status.st_uid);
     EXPECT_EQ(456U, status.st_gid);
 }

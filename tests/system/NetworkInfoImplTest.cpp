@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/NetworkInfoImpl.h>
 
+#include "../HostCtlFailure.h"
 #include "../TemporaryFolder.h"
-#include "../unit/strandctl/Failure.h"
 #include "Node.h"
 
 #include <cstdlib>

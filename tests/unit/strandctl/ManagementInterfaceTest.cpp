@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "ManagementInterface.h"
 
-#include "Failure.h"
+#include "HostCtlFailure.h"
 
 #include <gtest/gtest.h>
 #include <linux/rtnetlink.h>

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "WholeFile.h"
 
-#include "Failure.h"
+#include "HostCtlFailure.h"
 #include "TemporaryFolder.h"
 #include "Unprivileged.h"
 #include "faults/Faults.h"
@@ -59,21 +59,6 @@ TEST_F(WholeFileTest, ANewFileIsReadableWhateverTheMask) {
     ReplaceFile(target, "new");
     ::umask(mask);
     EXPECT_EQ(0644U, ModeOf(target));
-}
-
-TEST_F(WholeFileTest, KeepsTheOwnerWhereTheProcessMay) {
-    if (::geteuid() != 0) {
-        GTEST_SKIP() << "only root may give files away";
-    }
-    SetContents(target, "old");
-    ASSERT_EQ(0, ::chown(target.c_str(), 12345, 23456));
-    ASSERT_EQ(0, ::chmod(target.c_str(), 06755));
-    ReplaceFile(target, "new");
-    struct stat status = {};
-    ASSERT_EQ(0, ::stat(target.c_str(), &status));
-    EXPECT_EQ(12345U, status.st_uid);
-    EXPECT_EQ(23456U, status.st_gid);
-    EXPECT_EQ(06755U, ModeOf(target));
 }
 
 TEST_F(WholeFileTest, AReaderOfTheOldFileKeepsReadingIt) {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-#ifndef TESTS_UNIT_STRANDCTL_FAILURE_H
-#define TESTS_UNIT_STRANDCTL_FAILURE_H
+#ifndef TESTS_HOSTCTLFAILURE_H
+#define TESTS_HOSTCTLFAILURE_H
 
 #include <strandctl/HostCtlException.h>
 #include <string>
