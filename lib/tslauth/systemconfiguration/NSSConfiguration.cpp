@@ -14,8 +14,9 @@ std::deque<NSSService>& NSSConfiguration::operator[](NSSDatabase database) {
 }
 
 std::istream& operator>>(std::istream& in, NSSConfiguration& configuration) {
+    NSSLineReader reader(configuration);
     for (std::string line; std::getline(in, line);) {
-        ReadConfigurationLine(line, configuration);
+        reader.Read(line);
     }
     return in;
 }

@@ -26,7 +26,15 @@ void ReadParameters(std::string_view line, std::size_t open, std::size_t close,
 
 } // namespace
 
-void ReadConfigurationLine(std::string_view line, NSSConfiguration& configuration) {
+std::deque<NSSService>& NSSLineReader::ServicesOf(NSSDatabase::Database database) {
+    std::deque<NSSService>*& services = _services[database];
+    if (services == nullptr) {
+        services = &_configuration[database];
+    }
+    return *services;
+}
+
+void NSSLineReader::Read(std::string_view line) {
     if (line.empty() || line.front() == '#') {
         return;
     }
@@ -42,7 +50,6 @@ void ReadConfigurationLine(std::string_view line, NSSConfiguration& configuratio
     word.remove_suffix(word.empty() ? 0 : 1);
     auto const database = Words::ValueOf<NSSDatabase>(word);
 
-    std::deque<NSSService>* services = nullptr;
     // The first "]" at or after the position looked at. Positions only grow, so that it is searched
     // for again only when passed, and a long line costs no more a word than a short one.
     std::size_t close = 0;
@@ -67,20 +74,18 @@ void ReadConfigurationLine(std::string_view line, NSSConfiguration& configuratio
                 in.MoveTo(close + open < line.size() ? close + open : line.size());
             }
         }
-        if (services == nullptr) {
-            services = &configuration[database];
-        }
-        services->emplace_back(std::string(word));
+        NSSService& service = ServicesOf(database).emplace_back(word.data(), word.size());
         if (parameters) {
-            ReadParameters(line, open, close, services->back().parameters());
+            ReadParameters(line, open, close, service.parameters());
         }
     }
 }
 
 void ReadConfiguration(std::string_view text, NSSConfiguration& configuration) {
+    NSSLineReader reader(configuration);
     TextInput in(text);
     while (!in.AtEnd()) {
-        ReadConfigurationLine(in.Line(), configuration);
+        reader.Read(in.Line());
     }
 }
 

@@ -4,6 +4,7 @@
 
 #include <tslauth/systemconfiguration/NSSConfiguration.h>
 
+#include <deque>
 #include <string>
 #include <string_view>
 
@@ -14,8 +15,22 @@ namespace SystemConfiguration {
 /// As `operator>>`, with the same result and the same exceptions.
 void ReadConfiguration(std::string_view text, NSSConfiguration& configuration);
 
-/// Reads one line, given without its line feed. Both readers are a loop over this.
-void ReadConfigurationLine(std::string_view line, NSSConfiguration& configuration);
+/// Reads line by line. Both readers are a loop over this.
+class NSSLineReader {
+public:
+    /// @param configuration must outlive the reader, and no queue of it may be removed meanwhile
+    explicit NSSLineReader(NSSConfiguration& configuration) : _configuration(configuration) {}
+
+    /// @param line without its line feed
+    void Read(std::string_view line);
+
+private:
+    std::deque<NSSService>& ServicesOf(NSSDatabase::Database database);
+
+    NSSConfiguration& _configuration;
+    /// Made when the first service of the database has been understood, and looked up once.
+    std::deque<NSSService>* _services[NSSDatabase::aliases + 1] = {};
+};
 
 /// Each appends to `out` what `operator<<` writes. Where one throws, `out` holds what came before.
 void PrintService(NSSService const& service, std::string& out);

@@ -67,7 +67,7 @@ template <typename Input> void ReadLines(Input& in, PAMPolicy& policy) {
         if (stack == nullptr) {
             stack = &policy[facility];
         }
-        stack->emplace_back(std::move(control), std::string(module));
+        stack->emplace_back(std::move(control), module.data(), module.size());
         ReadParameters(line, stack->back().parameters());
     }
 }

@@ -4,6 +4,7 @@
 
 #include "../Export.h"
 
+#include <cstddef>
 #include <iosfwd>
 #include <list>
 #include <string>
@@ -19,6 +20,9 @@ class TSLAUTH_EXPORT NSSService {
 public:
     /// @param module the service's name as it is to stand in the file, such as `files`
     NSSService(std::string module) noexcept : _module(std::move(module)) {}
+
+    /// The same for a name that is part of a longer text.
+    NSSService(char const* module, std::size_t length) : _module(module, length) {}
 
     std::string const& module() const noexcept {
         return _module;

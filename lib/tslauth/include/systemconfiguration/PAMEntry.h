@@ -5,6 +5,7 @@
 #include "../Export.h"
 #include "PAMControl.h"
 
+#include <cstddef>
 #include <iosfwd>
 #include <list>
 #include <string>
@@ -25,6 +26,10 @@ public:
     /// the name of a policy
     PAMEntry(PAMControl control, std::string module) noexcept
         : _control(std::move(control)), _module(std::move(module)) {}
+
+    /// The same for a module that is part of a longer text.
+    PAMEntry(PAMControl control, char const* module, std::size_t length)
+        : _control(std::move(control)), _module(module, length) {}
 
     PAMControl const& control() const noexcept {
         return _control;
