@@ -7,11 +7,15 @@
 #include <tslauth/Configuration.h>
 
 #include <algorithm>
-#include <cstdio>
 #include <glib.h>
+#include <map>
 #include <memory>
+#include <numeric>
 #include <random>
 #include <stdexcept>
+#include <string>
+#include <tuple>
+#include <vector>
 
 namespace bench {
 
@@ -26,29 +30,32 @@ struct KeyFileOwner {
 };
 using KeyFile = std::unique_ptr<GKeyFile, KeyFileOwner>;
 
-/// A server and the thumbprint of its certificate.
-std::string Line(int number) {
-    char line[128];
-    std::snprintf(line, sizeof line,
-                  "cam%07d.example.com = \"7C:4A:8D:09:CA:37:62:AF:61:E5:95:20:94:3D:%07d\"\n",
-                  number, number);
-    return line;
-}
+/// What a file is full of.
+struct Shape {
+    char const* name;
+    char const *key, *value; ///< before the number that ends each
+};
 
-/// Made once for each number and order: a million lines take a while.
-std::string const& Lines(int count, bool shuffled) {
-    static std::map<std::pair<int, bool>, std::string> made;
-    std::string& text = made[{count, shuffled}];
+/// Keys and values that a string holds without memory of its own.
+constexpr Shape ShortKeys = {"short keys", "key", "value"};
+/// A server and the thumbprint of its certificate: three pieces of memory a key.
+constexpr Shape Servers = {"servers", "cam.example.com/server-",
+                           "7C:4A:8D:09:CA:37:62:AF:61:E5:95:20:94:3D:"};
+
+/// Made once for each shape, number and order: a million lines take a while.
+std::string const& Lines(Shape const& shape, int count, bool shuffled) {
+    static std::map<std::tuple<std::string, int, bool>, std::string> made;
+    std::string& text = made[{shape.name, count, shuffled}];
     if (text.empty()) {
-        std::vector<int> numbers;
-        for (int i = 0; i < count; ++i) {
-            numbers.push_back(i);
-        }
+        std::vector<int> numbers(static_cast<std::size_t>(count));
+        std::iota(numbers.begin(), numbers.end(), 0);
         if (shuffled) {
             std::shuffle(numbers.begin(), numbers.end(), std::mt19937(1));
         }
         for (int const number : numbers) {
-            text += Line(number);
+            std::string const digits = std::to_string(10000000 + number);
+            text.append(shape.key).append(digits).append(" = \"");
+            text.append(shape.value).append(digits).append("\"\n");
         }
     }
     return text;
@@ -78,16 +85,17 @@ void LoadByHand(std::string const& path) {
     }
 }
 
-void AddLoadCases(Table& table, std::string const& folder, int count, bool shuffled) {
+void AddLoadCases(Table& table, std::string const& folder, Shape const& shape, int count,
+                  bool shuffled) {
     std::string const path = folder + "/load.conf";
     auto const with = [=](char const* header, auto load) {
         return [=](benchmark::State& state) {
-            WriteFile(path, header + Lines(count, shuffled));
+            WriteFile(path, header + Lines(shape, count, shuffled));
             Measure(state, [&] { load(path); });
         };
     };
     table.Add(
-        "load " + std::string(count < 1000000 ? "1,000" : "1,000,000") + " keys " +
+        "load " + std::string(count < 1000000 ? "1,000" : "1,000,000") + " " + shape.name + " " +
             (shuffled ? "shuffled" : "in order"),
         {Bar::Of::Ratio, 0.5}, Clock::Processor, count < 1000000 ? 15 : 5,
         {{"ours",
@@ -133,12 +141,12 @@ void AddWriteCases(Table& table, std::string const& place, std::string const& fo
             // Loaded once: what is measured does not change it.
             static std::map<int, std::unique_ptr<Configuration>> loaded;
             auto& configuration = loaded[count];
-            WriteFile(path, Lines(count, false));
+            WriteFile(path, Lines(Servers, count, false));
             if (configuration == nullptr || observation.active) {
                 configuration = std::make_unique<Configuration>(path);
             }
             Measure(state, [&] { write(path, *configuration); });
-            ExpectFile(path, Lines(count, false));
+            ExpectFile(path, Lines(Servers, count, false));
         };
     };
     std::vector<Contender> contenders = {
@@ -148,7 +156,7 @@ void AddWriteCases(Table& table, std::string const& place, std::string const& fo
         contenders.push_back({"std::endl", with(WriteWithStreams<Configuration>)});
         contenders.push_back(
             {"GKeyFile", [=](benchmark::State& state) {
-                 WriteFile(path, "[servers]\n" + Lines(count, false));
+                 WriteFile(path, "[servers]\n" + Lines(Servers, count, false));
                  KeyFile const file = LoadKeyFile(path);
                  Measure(state, [&] {
                      if (!::g_key_file_save_to_file(file.get(), path.c_str(), nullptr)) {
@@ -157,7 +165,8 @@ void AddWriteCases(Table& table, std::string const& place, std::string const& fo
                  });
              }});
     }
-    table.Add("write " + std::string(count < 1000000 ? "1,000" : "1,000,000") + " keys, " + place,
+    table.Add("write " + std::string(count < 1000000 ? "1,000" : "1,000,000") + " servers, " +
+                  place,
               {Bar::Of::Ratio, 1.1}, memory ? Clock::Processor : Clock::Wall,
               count < 1000000 ? 15 : 5, contenders);
 }
@@ -167,7 +176,9 @@ void AddWriteCases(Table& table, std::string const& place, std::string const& fo
 void AddConfigurationCases(Table& table, Places const& places) {
     for (int const count : {1000, 1000000}) {
         for (bool const shuffled : {false, true}) {
-            AddLoadCases(table, places.front().second, count, shuffled);
+            for (Shape const& shape : {ShortKeys, Servers}) {
+                AddLoadCases(table, places.front().second, shape, count, shuffled);
+            }
         }
     }
     for (auto const& [place, folder] : places) {

@@ -105,8 +105,9 @@ public:
 
 /// Bytes for each "case/contender", from a process of its own: counting costs time.
 std::map<std::string, double> PeakMemory(char const* self) {
-    std::string const command =
-        "LD_PRELOAD='" PEAK_MEMORY_LIBRARY "' exec '" + std::string(self) + "' --observe";
+    std::string const command = "LD_PRELOAD='" PEAK_MEMORY_LIBRARY "' exec '" + std::string(self) +
+                                "' --observe --benchmark_filter='" +
+                                benchmark::GetBenchmarkFilter() + "'";
     std::unique_ptr<std::FILE, int (*)(std::FILE*)> const pipe(::popen(command.c_str(), "r"),
                                                                ::pclose);
     std::map<std::string, double> peaks;
