@@ -25,13 +25,15 @@ using namespace authentication;
 /// stay its own.
 std::string KeepOriginal(std::string const& path) {
     for (int number = 0;; ++number) {
-        auto const kept =
-            path + ".tslauth-orig" + (number > 0 ? "." + std::to_string(number) : std::string());
+        auto kept = path + ".tslauth-orig";
+        if (number > 0) {
+            kept += "." + std::to_string(number);
+        }
         if (linkat(AT_FDCWD, path.c_str(), AT_FDCWD, kept.c_str(), AT_SYMLINK_FOLLOW) == 0) {
             return kept;
         }
         if (int const error = errno; error != EEXIST) {
-            ThrowIOError("Cannot keep '" + path + "' as '" + kept + "'", error);
+            ThrowIOError("Cannot keep the original as '" + kept + "'", error);
         }
     }
 }
