@@ -5,7 +5,6 @@
 #include "Paths.h"
 #include "ProviderModules.h"
 #include "SystemFile.h"
-#include "ThrowMappedException.h"
 
 #include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
@@ -60,15 +59,6 @@ template <typename Answer, typename Call> Answer AnswerOr(Answer neutral, Call c
     }
 }
 
-/// A worker's failure that is none of the library's own: 1359 is ERROR_INTERNAL_ERROR.
-void ReportInternalError(RequestState& state) {
-    try {
-        ThrowMappedException(1359);
-    } catch (Exception const& failure) {
-        state.Done(&failure);
-    }
-}
-
 /// One of the questions that a worker asks. It runs at most once at a time in the process: `active`
 /// says that it runs, and is cleared by the worker when it ends, so that a provider that hangs
 /// keeps every further caller on the cache and never gathers threads.
@@ -120,6 +110,7 @@ Answer AskTimed(TimedQuestion<Answer> const& question, pthread_mutex_t& mutex, i
 /// The work of a worker: asks, stores the answer in `cache`, clears `active` and reports the end.
 /// A failure leaves the cache as it was. One of the library's own family reaches the waiter as it
 /// is; any other would end the host's process if it left the thread, and becomes an internal error.
+/// Answers are swapped in, so that nothing can fail under the lock.
 template <typename Answer, typename Ask>
 void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, Answer& cache,
                     Answer neutral, Ask ask) {
@@ -136,7 +127,7 @@ void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, A
         state.Done(&failure);
     } catch (...) {
         Clear(mutex, active);
-        ReportInternalError(state);
+        state.DoneWithInternalError();
     }
 }
 
@@ -147,6 +138,14 @@ template <typename Field, typename Ask> void Fill(Field& field, Ask ask) {
     } catch (...) {
         // One field that cannot be told must not hide the others.
     }
+}
+
+/// Unlike std::swap, which would copy this class, it cannot run out of memory.
+void Swap(ActiveDirectoryStoreConfiguration& left,
+          ActiveDirectoryStoreConfiguration& right) noexcept {
+    std::swap(left.activeDomain, right.activeDomain);
+    left.preferredDomainControllers.swap(right.preferredDomainControllers);
+    left.machineAccountDN.swap(right.machineAccountDN);
 }
 
 } // namespace
@@ -254,17 +253,23 @@ void ActiveDirectoryStore::SetPreferredDomainControllers(
 void ActiveDirectoryStore::GetStoreConfigurationInt(
     ProviderPointer provider, StatePointer state,
     boost::shared_ptr<ActiveDirectoryStoreConfiguration> cache) {
-    ActiveDirectoryStoreConfiguration answer;
-    Fill(answer.activeDomain, [&] { return provider->GetActiveDomain(); });
-    Fill(answer.preferredDomainControllers,
-         [&] { return provider->GetPreferredDomainControllers(); });
-    Fill(answer.machineAccountDN, [&] { return provider->GetMachineAccountDN(); });
-    {
-        MutexLock const lock(_lock);
-        std::swap(*cache, answer);
-        _isGetStoreConfigThreadActive = false;
+    try {
+        ActiveDirectoryStoreConfiguration answer;
+        Fill(answer.activeDomain, [&] { return provider->GetActiveDomain(); });
+        Fill(answer.preferredDomainControllers,
+             [&] { return provider->GetPreferredDomainControllers(); });
+        Fill(answer.machineAccountDN, [&] { return provider->GetMachineAccountDN(); });
+        {
+            MutexLock const lock(_lock);
+            Swap(*cache, answer);
+            _isGetStoreConfigThreadActive = false;
+        }
+        state->Done(nullptr);
+    } catch (...) {
+        // Not even an empty answer could be made.
+        Clear(_lock, _isGetStoreConfigThreadActive);
+        state->DoneWithInternalError();
     }
-    state->Done(nullptr);
 }
 
 void ActiveDirectoryStore::GetTrustedDomainsInt(ProviderPointer provider, StatePointer state,

@@ -3,10 +3,10 @@
 
 #include "MutexLock.h"
 #include "ThreadError.h"
+#include "ThrowMappedException.h"
 
 #include <cerrno>
 #include <limits>
-#include <new>
 #include <sys/time.h>
 
 namespace tessel::authentication {
@@ -46,10 +46,17 @@ void RequestState::Done(Exception const* failure) noexcept {
     if (failure) {
         try {
             _failure.reset(failure->Clone());
-        } catch (std::bad_alloc const&) {
+        } catch (...) {
             _failureLost = true;
         }
     }
+    pthread_cond_signal(&_condition);
+}
+
+void RequestState::DoneWithInternalError() noexcept {
+    MutexLock const lock(_mutex);
+    _done = true;
+    _failureLost = true;
     pthread_cond_signal(&_condition);
 }
 
@@ -69,7 +76,7 @@ void RequestState::WaitResult(int timeoutSeconds) {
         _failure->Throw();
     }
     if (_failureLost) {
-        throw std::bad_alloc();
+        ThrowMappedException(TSLAUTH_PROVIDER_INTERNAL_ERROR);
     }
 }
 

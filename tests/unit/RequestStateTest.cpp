@@ -123,11 +123,23 @@ struct CannotBeCopied : Exception {
 
 } // namespace
 
+constexpr char InternalError[] = "Exception 0x0000054f: An internal error occurred.";
+
 TEST(RequestState, FailureThatCannotBeKeptIsNotTakenForSuccess) {
     RequestState state;
     CannotBeCopied const failure;
     state.Done(&failure);
-    EXPECT_THROW(state.WaitResult(0), std::bad_alloc);
+    for (int i = 0; i < 2; ++i) {
+        EXPECT_THROW(state.WaitResult(0), InternalErrorException);
+        EXPECT_EQ(InternalError, MessageOf(state, 0));
+    }
+}
+
+TEST(RequestState, EndWithSomethingElseThanAnExceptionIsAnInternalError) {
+    RequestState state;
+    state.DoneWithInternalError();
+    EXPECT_THROW(state.WaitResult(0), InternalErrorException);
+    EXPECT_EQ(InternalError, MessageOf(state, 60));
 }
 
 TEST(RequestState, WaiterThatGivesUpLeavesTheWorkerItsState) {

@@ -25,8 +25,12 @@ public:
 
     /// Called by the worker, once, when its work has ended. `failure` is null on success; otherwise
     /// a copy of it is kept, and the object stays the caller's. Never throws: where the copy cannot
-    /// be made for lack of memory, that is what the waiter is told.
+    /// be made, the waiter is told of an internal error.
     void Done(Exception const* failure) noexcept;
+
+    /// Called instead of `Done` where the work ended with something that is no `Exception`, such as
+    /// `std::bad_alloc` or what a provider throws. Needs no memory.
+    void DoneWithInternalError() noexcept;
 
     /// Waits until the work has ended. May be called again, and after `Done`; it then answers at
     /// once and in the same way.
@@ -37,7 +41,8 @@ public:
     /// @throws ThreadErrorException where the wait itself fails. Its message is "Thread Error: " +
     ///     "pthread_cond_timedwait failed. RC=" without as many leading characters as the error
     ///     number (pthread_cond_timedwait(3)) says; support tools know the texts.
-    /// @throws std::bad_alloc where the worker's failure could not be kept
+    /// @throws InternalErrorException where the worker's failure was none of the library's own, or
+    ///     could not be kept
     void WaitResult(int timeoutSeconds);
 
 private:
