@@ -64,7 +64,7 @@ machine_configuration() {
         find /etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf \
             /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel \
             -type f -exec sha256sum {} + 2>/dev/null
-        ls -d /lib/security /usr/libexec/tslauth /run/lock/tslauthctl.lock 2>/dev/null
+        ls -d /lib/security /usr/libexec/tslauth /run/tslauthctl.lock 2>/dev/null
         echo "host name $(uname -n)"
     } | sort
 }

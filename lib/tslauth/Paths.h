@@ -28,8 +28,9 @@ inline constexpr char RemoteAuthenticationStoreKey[] = "remote-authentication-st
 /// The key of `ProviderConfiguration` and `CAMProviderConfiguration` that names the provider.
 inline constexpr char ProviderKey[] = "provider";
 
-/// Held by every `tslauthctl` command that changes the host.
-inline constexpr char ControlLock[] = "/run/lock/tslauthctl.lock";
+/// Held by every `tslauthctl` command that changes the host. Not in /run/lock, where every user may
+/// put a file of that name first.
+inline constexpr char ControlLock[] = "/run/tslauthctl.lock";
 
 } // namespace tessel::authentication::Paths
 

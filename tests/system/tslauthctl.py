@@ -19,7 +19,7 @@ PAM = pathlib.Path("/etc/pam.d/system-auth-generic")
 NSS = pathlib.Path("/etc/nsswitch.conf")
 RECORD = pathlib.Path("/etc/tessel/tslauth/authentication.conf")
 PROVIDER = pathlib.Path("/etc/tessel/tslauth/provider.conf")
-LOCK = pathlib.Path("/run/lock/tslauthctl.lock")
+LOCK = pathlib.Path("/run/tslauthctl.lock")
 FILES = (PAM, NSS, RECORD)
 
 AD = "Active Directory"
