@@ -21,7 +21,7 @@ using authentication::SystemText;
 using authentication::Paths::ControlLock;
 
 int OpenLockFile() {
-    // Not followed: the folder is one that everybody may write to.
+    // A link is not followed: whatever it leads to, it is not the lock.
     return open(ControlLock, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NOCTTY, 0600);
 }
 
@@ -35,12 +35,6 @@ int OpenLockFile() {
 } // namespace
 
 ControlLock::ControlLock(Output& output) : _descriptor(OpenLockFile()) {
-    if (_descriptor < 0 && errno == ENOENT) {
-        std::string const file = authentication::Paths::ControlLock;
-        // If this fails, opening the file does so again, and tells.
-        (void)mkdir(file.substr(0, file.rfind('/')).c_str(), 0755);
-        _descriptor = OpenLockFile();
-    }
     if (_descriptor < 0) {
         Fail(-1, SystemText(errno));
     }

@@ -253,11 +253,6 @@ class Activate(Case):
         self.assertEqual(DONE, ask("activate", AD)["exit"])
         self.assertEqual(0o600, LOCK.stat().st_mode & 0o7777)
 
-    def test_the_folder_of_the_lock_is_made(self):
-        LOCK.unlink(missing_ok=True)
-        LOCK.parent.rmdir()
-        self.assertEqual(DONE, ask("activate", AD)["exit"])
-
 
 class Prepare(Case):
     def test_a_stock_debian_host_goes_all_the_way(self):
