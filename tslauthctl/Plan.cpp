@@ -31,7 +31,7 @@ void AddLossesOnReturn(std::vector<std::string> const& losses, PlannedFile& file
 void AddCommentNote(std::size_t before, std::size_t after, PlannedFile& file) {
     if (after < before) {
         file.notes.push_back(Counted(before - after, "comment") +
-                             " would be dropped, which mean nothing to the system");
+                             " without effect on the system would be dropped");
     }
 }
 

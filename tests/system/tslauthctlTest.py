@@ -133,7 +133,7 @@ class Plan(Case):
         self.assertEqual(["auth: entry 'required b.so [x  y]' would become 'required b.so [x y]'"],
                          losses[str(PAM)])
         notes = [note for file in document["files"] for note in file["notes"]]
-        self.assertEqual(["1 comment would be dropped, which mean nothing to the system"], notes)
+        self.assertEqual(["1 comment without effect on the system would be dropped"], notes)
 
     def test_a_refusal_of_a_reader_is_told(self):
         set_up(nss=PLAIN_NSS + "gshadow: files\n")
