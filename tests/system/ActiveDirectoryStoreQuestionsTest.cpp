@@ -1,15 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "Host.h"
-#include "providers/Gate.h"
+#include "GatedHost.h"
 
-#include <tslauth/ActiveDirectoryStore.h>
 #include <tslauth/Exceptions.h>
-#include <tslauth/string_cast.h>
 
-#include <dlfcn.h>
 #include <gmock/gmock.h>
-#include <memory>
-#include <thread>
+#include <limits>
 #include <vector>
 
 TSLAUTH_AUTO_PTR_BEGIN
@@ -20,98 +15,16 @@ using testing::IsEmpty;
 
 namespace {
 
-/// Whom a provider answers: no time at all, or all it takes.
-constexpr int NoTime = 0;
-constexpr int Time = 60;
+std::string const ConfigurationTimedOut =
+    SystemLog::Warning("GetStoreConfiguration call timedout. Returning cached value.");
+std::string const DomainsTimedOut =
+    SystemLog::Warning("GetTrustedDomains call timedout. Returning cached value.");
+std::string const TrustStateTimedOut =
+    SystemLog::Warning("GetDomainTrustState call timedout. Returning cached value.");
 
 } // namespace
 
-class ActiveDirectoryStoreQuestionsTest : public Host::Test {
-protected:
-    void SetUp() override {
-        Host::Test::SetUp();
-        UseProvider("gate");
-        _impatient = std::make_unique<ActiveDirectoryStore>(NoTime);
-        _patient = std::make_unique<ActiveDirectoryStore>(Time);
-        _library = dlopen("/usr/libexec/tslauth/libgate.so", RTLD_LAZY | RTLD_NOLOAD);
-        ASSERT_TRUE(_library);
-        _gate = static_cast<Gate*>(dlsym(_library, "gate"));
-        ASSERT_TRUE(_gate);
-        Change([](Gate& it) {
-            it.code = it.value = 0;
-            it.calls = it.mostInside = 0;
-        });
-    }
-
-    void TearDown() override {
-        if (_gate) {
-            Open();
-            AwaitNobodyInside();
-            dlclose(_library);
-        }
-        Host::Test::TearDown();
-    }
-
-    static void UseProvider(std::string const& name) {
-        Host::Write(Paths::ProviderConfiguration, "provider = \"" + name + "\"\n");
-    }
-
-    template <typename Edit> void Change(Edit edit) {
-        pthread_mutex_lock(&_gate->lock);
-        edit(*_gate);
-        pthread_cond_broadcast(&_gate->change);
-        pthread_mutex_unlock(&_gate->lock);
-    }
-    void Close() {
-        Change([](Gate& it) { it.closed = 1; });
-    }
-    void Open() {
-        Change([](Gate& it) { it.closed = 0; });
-    }
-    /// Waits until a worker has reached the gate; ctest ends a test that waits for ever.
-    void AwaitSomebodyInside() {
-        Await([](Gate const& it) { return it.inside != 0; });
-    }
-    void AwaitNobodyInside() {
-        Await([](Gate const& it) { return it.inside == 0; });
-    }
-    unsigned Calls() {
-        unsigned calls = 0;
-        Change([&](Gate& it) { calls = it.calls; });
-        return calls;
-    }
-
-    /// The snapshot, as its own class.
-    static ActiveDirectoryStoreConfiguration ConfigurationOf(ActiveDirectoryStore const& store) {
-        std::auto_ptr<StoreConfiguration> const configuration = store.GetStoreConfiguration();
-        return dynamic_cast<ActiveDirectoryStoreConfiguration&>(*configuration);
-    }
-
-    /// Asks until the worker that was late has delivered.
-    static std::deque<Domain> EventuallyTrustedDomains(ActiveDirectoryStore const& store) {
-        std::deque<Domain> domains;
-        for (int i = 0; i < 500 && domains.empty(); ++i) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(10));
-            domains = store.GetTrustedDomains();
-        }
-        return domains;
-    }
-
-    std::unique_ptr<ActiveDirectoryStore> _impatient;
-    std::unique_ptr<ActiveDirectoryStore> _patient;
-    Gate* _gate = nullptr;
-
-private:
-    template <typename Condition> void Await(Condition condition) {
-        pthread_mutex_lock(&_gate->lock);
-        while (!condition(*_gate)) {
-            pthread_cond_wait(&_gate->change, &_gate->lock);
-        }
-        pthread_mutex_unlock(&_gate->lock);
-    }
-
-    void* _library = nullptr;
-};
+using ActiveDirectoryStoreQuestionsTest = Host::GatedTest;
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, AnswersComeFromTheProvider) {
     Change([](Gate& it) { it.value = 42; });
@@ -197,6 +110,18 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, MissingFileOfTrustedDomainsIsTrustStat
     unsigned const before = Calls();
     EXPECT_EQ(7, _patient->GetDomainTrustState());
     EXPECT_EQ(before + 1, Calls()) << "the trust state itself was not asked for";
+    EXPECT_THAT(_log.Messages(), IsEmpty());
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, TrustStateSevenIsKept) {
+    Change([](Gate& it) { it.code = 2; });
+    EXPECT_EQ(7, _patient->GetDomainTrustState());
+    // A worker that hangs for another store shows what this one has kept.
+    Close();
+    std::thread hanging([this] { _impatient->GetDomainTrustState(); });
+    AwaitSomebodyInside();
+    hanging.join();
+    EXPECT_EQ(7, _patient->GetDomainTrustState());
 }
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, OtherFailureOfTrustedDomainsDoesNotHideTheTrustState) {
@@ -205,20 +130,96 @@ TEST_F(ActiveDirectoryStoreQuestionsTest, OtherFailureOfTrustedDomainsDoesNotHid
         it.value = -3;
     });
     EXPECT_EQ(-3, _patient->GetDomainTrustState());
+    EXPECT_THAT(_log.Messages(),
+                ElementsAre(SystemLog::Warning(
+                    "GetDomainTrustState: Call to GetTrustedDomains() failed: "
+                    "Exception 0x0000054b: "
+                    "The specified domain either does not exist or could not be contacted.")));
 }
 
-TEST_F(ActiveDirectoryStoreQuestionsTest, QuestionsThatTheProviderLacksHaveANeutralAnswer) {
-    UseProvider("null-entries");
-    ActiveDirectoryStore store(Time);
+TEST_F(ActiveDirectoryStoreQuestionsTest, NoTimeStartsAWorkerAndLogsOnceForEachQuestion) {
+    Close();
+    EXPECT_EQ("", ConfigurationOf(*_impatient).activeDomain.DNSName());
+    EXPECT_THAT(_log.Messages(), ElementsAre(ConfigurationTimedOut));
+    // Now a worker runs: from the cache at once, without a log and without another worker.
+    EXPECT_EQ("", ConfigurationOf(*_impatient).activeDomain.DNSName());
+    EXPECT_EQ("", ConfigurationOf(*_patient).activeDomain.DNSName());
+    EXPECT_THAT(_log.Messages(), ElementsAre(ConfigurationTimedOut));
+
+    _log.Forget();
+    EXPECT_THAT(_impatient->GetTrustedDomains(), IsEmpty());
+    EXPECT_THAT(_impatient->GetTrustedDomains(), IsEmpty());
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut));
+
+    _log.Forget();
+    EXPECT_EQ(0, _impatient->GetDomainTrustState());
+    EXPECT_EQ(0, _impatient->GetDomainTrustState());
+    EXPECT_THAT(_log.Messages(), ElementsAre(TrustStateTimedOut));
+    Await([](Gate const& it) { return it.inside == 3; });
+    EXPECT_EQ(3U, Calls());
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, TrustStateWaitsForBothOfItsQuestions) {
+    Close();
+    EXPECT_EQ(0, _impatient->GetDomainTrustState());
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut, TrustStateTimedOut));
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, TimeoutIsTheStores) {
+    Close();
+    Store const store(1);
+    auto const start = std::chrono::steady_clock::now();
     EXPECT_THAT(store.GetTrustedDomains(), IsEmpty());
-    EXPECT_EQ(0, store.GetDomainTrustState());
-    EXPECT_EQ(0, store.GetDomainTrustRelationship("corp.example"));
-    EXPECT_EQ("", store.GetHostPrincipalForDomain("corp.example"));
-    EXPECT_EQ("", store.GetDomainControllerForDomain("corp.example"));
-    EXPECT_EQ("CORP\\user", store.ConvertCanonicalUsername("CORP\\user"));
-    EXPECT_NO_THROW(store.SetPreferredDomainControllers({"dc1"}));
-    EXPECT_EQ("DNS Name: (unset), NetBIOS Name: (unset)",
-              string_cast(ConfigurationOf(store).activeDomain));
+    auto const waited = std::chrono::steady_clock::now() - start;
+    // The limit is on the wall clock, which may be set meanwhile; a little less is allowed for.
+    EXPECT_LE(std::chrono::milliseconds(990), waited);
+    EXPECT_GT(std::chrono::milliseconds(10000), waited);
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut));
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, NegativeTimeoutIsNoTime) {
+    Close();
+    Store const store(-1);
+    EXPECT_THAT(store.GetTrustedDomains(), IsEmpty());
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut));
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, HugeTimeoutWaitsForTheProvider) {
+    Store const store(std::numeric_limits<int>::max());
+    EXPECT_EQ(1U, store.GetTrustedDomains().size());
+    EXPECT_THAT(_log.Messages(), IsEmpty());
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, CachesBelongToOneStoreAndFlagsToAll) {
+    EXPECT_EQ(1U, _patient->GetTrustedDomains().size());
+    Close();
+    EXPECT_THAT(_impatient->GetTrustedDomains(), IsEmpty());
+    // The other store's worker keeps this one from asking, and its cache is its own.
+    EXPECT_EQ(1U, _patient->GetTrustedDomains().size());
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut));
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, FailureThatComesTooLateReachesNobodyAndSparesTheCache) {
+    EXPECT_EQ(1U, _patient->GetTrustedDomains().size());
+    Close();
+    Change([](Gate& it) { it.code = 1355; });
+    Store const store(NoTime);
+    EXPECT_THAT(store.GetTrustedDomains(), IsEmpty());
+    Open();
+    AwaitEndOfWorkers();
+    EXPECT_THAT(_log.Messages(), ElementsAre(DomainsTimedOut));
+    EXPECT_THROW(_patient->GetTrustedDomains(), NoSuchDomainException)
+        << "the failure has cleared the flag";
+}
+
+TEST_F(ActiveDirectoryStoreQuestionsTest, ThreeQuestionsAreAskedAtTheSameTime) {
+    Close();
+    ConfigurationOf(*_impatient);
+    _impatient->GetTrustedDomains();
+    _impatient->GetDomainTrustState();
+    Await([](Gate const& it) { return it.inside == 3; });
+    Open();
+    AwaitEndOfWorkers();
 }
 
 TEST_F(ActiveDirectoryStoreQuestionsTest, ManyCallersShareOneWorkerAQuestion) {
