@@ -15,9 +15,10 @@ extern "C" {
 typedef struct Gate {
     pthread_mutex_t lock;
     pthread_cond_t change;
-    int closed; /* a call stays inside until this is 0 */
-    int code;   /* the answer of every entry that returns a code */
-    int value;  /* of the trust state */
+    int closed;      /* a call stays inside until this is 0 */
+    int domainsOpen; /* but one for the trusted domains only until this is not 0 */
+    int code;        /* the answer of every entry that returns a code */
+    int value;       /* of the trust state */
 
     unsigned calls;      /* begun so far */
     unsigned inside;     /* now */

@@ -4,10 +4,14 @@
 
 #include <stddef.h>
 
-Gate gate = {PTHREAD_MUTEX_INITIALIZER, PTHREAD_COND_INITIALIZER, 0, 0, 0, 0, 0, 0};
+Gate gate = {PTHREAD_MUTEX_INITIALIZER, PTHREAD_COND_INITIALIZER, 0, 0, 0, 0, 0, 0, 0};
 
-/* Passes the gate, and tells what it says. The calls on a plain mutex cannot fail. */
-static int Pass(int* value) {
+/* For the calls that only the gate itself lets through. */
+static int const never = 0;
+
+/* Passes the gate, also where it is closed and `open` says otherwise, and tells what it says. The
+ * calls on a plain mutex cannot fail. */
+static int Pass(int const* open, int* value) {
     int code;
     (void)pthread_mutex_lock(&gate.lock);
     ++gate.calls;
@@ -16,7 +20,7 @@ static int Pass(int* value) {
         gate.mostInside = gate.inside;
     }
     (void)pthread_cond_broadcast(&gate.change);
-    while (gate.closed) {
+    while (gate.closed && !*open) {
         (void)pthread_cond_wait(&gate.change, &gate.lock);
     }
     code = gate.code;
@@ -39,7 +43,7 @@ static int GetActiveDomain(ActiveDirectoryClientDomain* domain,
     domain->dnsName = "corp.example";
     domain->netBIOSName = "CORP";
     *release = Keep;
-    return Pass(NULL);
+    return Pass(&never, NULL);
 }
 
 static int GetPreferredDomainControllers(char*** controllers,
@@ -49,12 +53,12 @@ static int GetPreferredDomainControllers(char*** controllers,
     static char* names[] = {first, second, NULL};
     *controllers = names;
     *release = Keep;
-    return Pass(NULL);
+    return Pass(&never, NULL);
 }
 
 static int GetDomainTrustState(void) {
     int value;
-    (void)Pass(&value); /* the entry has no code */
+    (void)Pass(&never, &value); /* the entry has no code */
     return value;
 }
 
@@ -64,7 +68,7 @@ static int GetTrustedDomains(ActiveDirectoryClientDomain*** domains,
     static ActiveDirectoryClientDomain* list[] = {&other, NULL};
     *domains = list;
     *release = Keep;
-    return Pass(NULL);
+    return Pass(&gate.domainsOpen, NULL);
 }
 
 ActiveDirectoryClientMetadataRecord const ActiveDirectoryClientMetadata = {2, "pam_gate.so", NULL,

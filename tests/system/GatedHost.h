@@ -38,7 +38,7 @@ protected:
         _impatient = std::make_unique<Store>(NoTime);
         _patient = std::make_unique<Store>(Time);
         Change([](Gate& it) {
-            it.code = it.value = 0;
+            it.code = it.value = it.domainsOpen = 0;
             it.calls = it.mostInside = 0;
         });
     }
@@ -106,10 +106,13 @@ protected:
 
     /// Waits until every worker is gone, and with them their hold on flags and stores.
     void AwaitEndOfWorkers() const {
-        for (int i = 0; i < 1000 && Threads() != _threads; ++i) {
+        AwaitWorkers(0);
+    }
+    void AwaitWorkers(std::size_t count) const {
+        for (int i = 0; i < 1000 && Threads() != _threads + count; ++i) {
             std::this_thread::sleep_for(std::chrono::milliseconds(10));
         }
-        EXPECT_EQ(_threads, Threads());
+        EXPECT_EQ(_threads + count, Threads());
     }
 
     SystemLog _log;
