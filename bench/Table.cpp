@@ -12,6 +12,9 @@
 #include <iostream>
 #include <map>
 #include <memory>
+#include <random>
+#include <regex>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <utility>
 
@@ -194,53 +197,107 @@ void Table::AddGrowth(std::string name, Bar bar, std::string few, double fewLine
                       manyLines});
 }
 
-void Table::Register() const {
-    for (Case const& row : _cases) {
-        for (Contender const& contender : row.contenders) {
-            std::string const name = row.name + "/" + contender.name;
-            auto* const registered = benchmark::RegisterBenchmark(
-                name.c_str(),
-                [name, clock = row.clock, body = contender.body](benchmark::State& state) {
-                    observation.running = name;
-                    observation.clock = clock;
-                    observation.peak = 0;
-                    try {
-                        body(state);
-                    } catch (std::exception const& failure) {
-                        state.SkipWithError(failure.what());
-                    }
-                    if (observation.active && PeakMemoryMost != nullptr) {
-                        std::printf("%s\t%zu\n", name.c_str(), observation.peak);
-                        (void)std::fflush(stdout);
-                    }
-                });
-            if (contender.timedByHand) {
-                registered->UseManualTime();
-            } else if (row.clock == Clock::Wall) {
-                registered->UseRealTime();
+namespace {
+
+void Register(Case const& row, Contender const& contender) {
+    std::string const name = row.name + "/" + contender.name;
+    auto* const registered =
+        benchmark::RegisterBenchmark(name.c_str(), [=](benchmark::State& state) {
+            observation.running = name;
+            observation.clock = row.clock;
+            observation.peak = 0;
+            try {
+                contender.body(state);
+            } catch (std::exception const& failure) {
+                state.SkipWithError(failure.what());
             }
-            if (observation.active) {
-                registered->Iterations(1);
-            } else {
-                registered->MinTime(0.03);
-                registered->Repetitions(row.repetitions);
+            if (observation.active && PeakMemoryMost != nullptr) {
+                std::printf("%s\t%zu\n", name.c_str(), observation.peak);
+                (void)std::fflush(stdout);
             }
+        });
+    if (contender.timedByHand) {
+        registered->UseManualTime();
+    } else if (row.clock == Clock::Wall) {
+        registered->UseRealTime();
+    }
+    if (observation.active) {
+        registered->Iterations(1);
+    } else {
+        registered->MinTime(0.03);
+    }
+}
+
+/// Runs a contender once, in a process of its own: what others leave of the heap, and in which
+/// order they ran, would change the time of everything that allocates.
+void RunAlone(Case const& row, Contender const& contender, Collector& collector) {
+    std::string const name = row.name + "/" + contender.name;
+    int ends[2];
+    if (::pipe(ends) != 0) {
+        collector.failures[name] = "no pipe";
+        return;
+    }
+    pid_t const child = ::fork();
+    if (child == 0) {
+        Register(row, contender);
+        Collector own;
+        benchmark::RunSpecifiedBenchmarks(&own);
+        std::string const answer = own.failures.empty() ? Format("%.17g", own.times[name].at(0))
+                                                        : "!" + own.failures[name];
+        ssize_t const written = ::write(ends[1], answer.data(), answer.size());
+        ::_exit(written == static_cast<ssize_t>(answer.size()) ? 0 : 1);
+    }
+    ::close(ends[1]);
+    char answer[1024] = {};
+    ssize_t const count = ::read(ends[0], answer, sizeof answer - 1);
+    ::close(ends[0]);
+    int status = 0;
+    if (child < 0 || ::waitpid(child, &status, 0) != child || status != 0 || count <= 0) {
+        collector.failures[name] = "the process ended early";
+    } else if (answer[0] == '!') {
+        collector.failures[name] = answer + 1;
+    } else {
+        collector.times[name].push_back(std::strtod(answer, nullptr));
+    }
+}
+
+/// Runs the contenders of a case in turn, each time in another order.
+void RunInTurn(Case const& row, std::regex const& filter, Collector& collector) {
+    std::vector<Contender const*> chosen;
+    for (Contender const& contender : row.contenders) {
+        if (std::regex_search(row.name + "/" + contender.name, filter)) {
+            chosen.push_back(&contender);
+        }
+    }
+    std::mt19937 random(1);
+    for (int i = 0; i < row.repetitions; ++i) {
+        std::shuffle(chosen.begin(), chosen.end(), random);
+        for (Contender const* const contender : chosen) {
+            RunAlone(row, *contender, collector);
         }
     }
 }
 
+} // namespace
+
 void Table::Observe() const {
     observation.active = true;
-    Register();
+    for (Case const& row : _cases) {
+        for (Contender const& contender : row.contenders) {
+            Register(row, contender);
+        }
+    }
     Collector collector;
     benchmark::RunSpecifiedBenchmarks(&collector);
 }
 
 bool Table::Run(char const* self) const {
     auto const peaks = PeakMemory(self);
-    Register();
     Collector collector;
-    benchmark::RunSpecifiedBenchmarks(&collector);
+    std::regex const filter(benchmark::GetBenchmarkFilter());
+    for (Case const& row : _cases) {
+        RunInTurn(row, filter, collector);
+    }
 
     auto const median = [&](std::string const& name) {
         auto const found = collector.times.find(name);

@@ -52,7 +52,7 @@ struct Case {
 
 class Table {
 public:
-    /// @param repetitions of each contender, in random order among all; the medians are compared
+    /// @param repetitions of each contender, in turn with the others; the medians are compared
     void Add(std::string name, Bar bar, Clock clock, int repetitions,
              std::vector<Contender> contenders);
 
@@ -70,8 +70,6 @@ public:
     void Observe() const;
 
 private:
-    void Register() const;
-
     std::vector<Case> _cases;
 };
 

@@ -17,10 +17,6 @@ int main(int count, char** values) {
         observe = true;
         arguments.erase(arguments.begin() + 1);
     }
-    char interleaved[] = "--benchmark_enable_random_interleaving=true";
-    if (!observe) {
-        arguments.push_back(interleaved);
-    }
     int left = static_cast<int>(arguments.size());
     arguments.push_back(nullptr);
     benchmark::Initialize(&left, arguments.data());
