@@ -11,7 +11,7 @@ import unittest
 
 from tslauthctl import *
 
-ROUNDS = 100
+ROUNDS = 50
 
 # Loads, and names modules that no host has.
 SILENT_PROVIDER = "no-parameters"

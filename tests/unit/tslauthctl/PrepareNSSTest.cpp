@@ -159,7 +159,7 @@ std::string RandomLine(std::mt19937& random) {
 TEST(PrepareNSSTest, AnyBytesArePreparedOrGivenUp) {
     std::mt19937 random(5);
     constexpr char bytes[] = " \t\n\r\v:#[]!=\0\xff\x80passwdhostsfilesSUCCESS=return";
-    for (int i = 0; i < 3000; ++i) {
+    for (int i = 0; i < 800; ++i) {
         std::string text;
         for (auto size = random() % 60; size > 0; --size) {
             text += bytes[random() % sizeof bytes];
@@ -175,7 +175,7 @@ TEST(PrepareNSSTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(7);
     auto const provider = PlaceholderEntries();
     int carried = 0;
-    for (int i = 0; i < 3000; ++i) {
+    for (int i = 0; i < 800; ++i) {
         std::string text;
         for (auto lines = 1 + random() % 6; lines > 0; --lines) {
             text += RandomLine(random) + "\n";

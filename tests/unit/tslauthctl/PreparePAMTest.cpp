@@ -165,7 +165,7 @@ TEST(PreparePAMTest, AnyBytesArePreparedOrGivenUp) {
                                  "success=1",
                                  "=",
                                  std::string(1000, 'x')};
-    for (int i = 0; i < 3000; ++i) {
+    for (int i = 0; i < 800; ++i) {
         std::string text = usual;
         for (auto size = random() % 40; size > 0; --size) {
             text += words[random() % std::size(words)];
@@ -184,7 +184,7 @@ TEST(PreparePAMTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(11);
     auto const provider = PlaceholderEntries();
     int carried = 0;
-    for (int i = 0; i < 1500; ++i) {
+    for (int i = 0; i < 400; ++i) {
         std::string text = usual;
         for (auto lines = 1 + random() % 5; lines > 0; --lines) {
             text += RandomEntry(random) + "\n";
