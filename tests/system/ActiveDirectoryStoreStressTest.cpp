@@ -21,6 +21,20 @@ TSLAUTH_AUTO_PTR_BEGIN
 
 using namespace tessel::authentication;
 
+// The sanitizers bring a `new` of their own, and look for leaks themselves.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+#define COUNTS_MEMORY 0
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
+#define COUNTS_MEMORY 0
+#endif
+#endif
+#ifndef COUNTS_MEMORY
+#define COUNTS_MEMORY 1
+#endif
+
+#if COUNTS_MEMORY
+
 namespace {
 
 /// What `new` has handed out and not got back: the library's and the test's own.
@@ -62,6 +76,8 @@ void operator delete(void* memory, std::size_t /*size*/) noexcept {
 void operator delete[](void* memory, std::size_t /*size*/) noexcept {
     Release(memory);
 }
+
+#endif
 
 namespace {
 
@@ -169,7 +185,9 @@ std::size_t EntriesOf(char const* path) {
 struct Resources {
     std::size_t threads = EntriesOf("/proc/self/task");
     std::size_t descriptors = EntriesOf("/proc/self/fd");
+#if COUNTS_MEMORY
     long memory = allocations;
+#endif
 };
 
 void AwaitEndOfWorkers(std::size_t threads) {
@@ -187,7 +205,9 @@ TEST_F(ActiveDirectoryStoreStressTest, HundredThousandQueriesKeepEveryPromise) {
     SystemLog::MakePrivateDevices(); // where there is no system log to fill
     Erratic counts = {};
     Tally tally;
-    // What is made once a process is made before anything is counted.
+    // What is made once a process is made before anything is counted; the thread sanitizer has a
+    // thread of its own from the first one on.
+    std::thread([] {}).join();
     std::size_t const threads = EntriesOf("/proc/self/task");
     CallManyFromManyThreads(10, tally);
     AwaitEndOfWorkers(threads);
@@ -222,7 +242,9 @@ TEST_F(ActiveDirectoryStoreStressTest, HundredThousandQueriesKeepEveryPromise) {
 
     EXPECT_EQ(before.threads, after.threads);
     EXPECT_EQ(before.descriptors, after.descriptors);
+#if COUNTS_MEMORY
     EXPECT_EQ(before.memory, after.memory);
+#endif
     EXPECT_FALSE(LoadedProvider::IsLoaded("erratic")) << "somebody still holds it";
 }
 
