@@ -3,10 +3,13 @@
 
 #include "Text.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <sys/ioctl.h>
 #include <unistd.h>
+#include <utility>
 
 namespace tessel::tslauthctl {
 
@@ -36,6 +39,15 @@ bool WantsColour(Colour colour) {
     char const* const terminal = std::getenv("TERM");
     return !Set("NO_COLOR") && isatty(STDOUT_FILENO) == 1 &&
            (terminal == nullptr || std::strcmp(terminal, "dumb") != 0);
+}
+
+constexpr char clearLine[] = "\r\x1b[K";
+
+/// Whether the error stream is a screen on which a line can be written anew.
+bool CanOverwrite() {
+    char const* const terminal = std::getenv("TERM");
+    return isatty(STDERR_FILENO) == 1 && terminal != nullptr && *terminal != '\0' &&
+           std::strcmp(terminal, "dumb") != 0;
 }
 
 /// @return false, with errno set, where not all of it could be written
@@ -71,6 +83,12 @@ char const* Word(ExitCode code) {
         return "drift";
     case ExitCode::changes:
         return "changes";
+    case ExitCode::unreachable:
+        return "unreachable";
+    case ExitCode::credentials:
+        return "credentials";
+    case ExitCode::notJoined:
+        return "not-joined";
     }
     return "failure";
 }
@@ -128,6 +146,37 @@ void Output::Waiting(std::string_view text) {
     }
 }
 
+void Output::Progress(std::string_view text) {
+    if (!CanOverwrite()) {
+        if (!std::exchange(_progress, true)) {
+            Waiting(text);
+        }
+        return;
+    }
+    auto shown = "tslauthctl: " + Escaped(text);
+    winsize size = {};
+    if (ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 1) {
+        // A line that is broken at the edge could not be overwritten.
+        shown.resize(std::min<std::size_t>(shown.size(), size.ws_col - 1U));
+        while ((static_cast<unsigned char>(shown.back()) & 0x80U) != 0) {
+            shown.pop_back(); // nor is half a character shown
+        }
+    }
+    _progress = true;
+    (void)WriteAll(STDERR_FILENO, clearLine + shown); // nothing depends on it
+}
+
+void Output::EndProgress() {
+    if (std::exchange(_progress, false) && CanOverwrite()) {
+        (void)WriteAll(STDERR_FILENO, clearLine); // nor on this
+    }
+}
+
+void Output::Interrupted(std::string_view text) {
+    // The process ends whether it can be told or not.
+    (void)WriteAll(STDERR_FILENO, "tslauthctl: " + Escaped(text) + "\n");
+}
+
 void Output::Error(Failure const& failure) {
     _errors += "tslauthctl: " + Escaped(failure.what()) + "\n";
     auto& error = _document["error"];
@@ -147,8 +196,9 @@ int Output::Finish(ExitCode code) {
         _document["schema"] = 1;
         _document["exit"] = static_cast<int>(code);
         _document["outcome"] = Word(code);
-        // Bytes of files that are not UTF-8 cannot stand in JSON; they become U+FFFD.
-        _text = _document.dump(2, ' ', false, nlohmann::json::error_handler_t::replace) + "\n";
+        // Bytes of files that are not UTF-8 cannot stand in JSON; they become U+FFFD. Whatever is
+        // not ASCII is escaped: there are control characters among it.
+        _text = _document.dump(2, ' ', true, nlohmann::json::error_handler_t::replace) + "\n";
     } else if (!WriteAll(STDERR_FILENO, _errors)) {
         code = ExitCode::failure;
     }

@@ -19,7 +19,10 @@ enum class ExitCode {
     refused = 4,
     loss = 5,
     drift = 6,
-    changes = 7
+    changes = 7,
+    unreachable = 8,
+    credentials = 9,
+    notJoined = 10
 };
 
 /// The word for an exit code, as it stands in the JSON document.
@@ -64,6 +67,13 @@ public:
     /// At once, and only if somebody sits there: why nothing happens.
     void Waiting(std::string_view text);
 
+    /// As `Waiting`, but the next one takes its place, and `EndProgress` leaves nothing of it.
+    void Progress(std::string_view text);
+    void EndProgress();
+
+    /// At once, to the error stream: what is not finished, before the process ends by a signal.
+    void Interrupted(std::string_view text);
+
     /// To the error stream; in the JSON document, "error".
     void Error(Failure const& failure);
     /// To the error stream, below an error. Not for JSON, which has it in fields.
@@ -82,6 +92,7 @@ private:
 
     bool _json;
     bool _colour;
+    bool _progress = false;
     std::string _text;
     std::string _errors;
     nlohmann::json _document;

@@ -14,6 +14,8 @@
 #include <cstring>
 #include <functional>
 #include <iostream>
+#include <limits>
+#include <unistd.h>
 
 namespace {
 
@@ -28,7 +30,14 @@ constexpr char footer[] = R"(Exit codes:
   5  would lose something; nothing was changed
   6  the host is not in step with the recorded store (status)
   7  there is something to change (plan, prepare)
+  8  timed out or unreachable
+  9  credentials refused
+  10 not joined
+  A signal such as ^C ends the tool as such; a shell shows 128 and its number, 130 for ^C.
 )";
+
+/// Seconds; that of the store that services use.
+constexpr int DefaultTimeout = 60;
 
 struct Arguments {
     bool json = false;
@@ -36,7 +45,18 @@ struct Arguments {
     std::string store;
     bool acceptLoss = false;
     bool write = false;
+    JoinArguments join;
+    /// Of a domain or of a user.
+    std::string name;
+    std::vector<std::string> names;
+    std::string server;
+    std::string file;
+    Limit limit{DefaultTimeout};
 };
+
+std::string NotEmpty(std::string const& text) {
+    return text.empty() ? "must not be empty" : std::string();
+}
 
 /// Parses, or says how the process ends without a command.
 class Parser {
@@ -77,6 +97,10 @@ public:
         prepare->add_flag("--write", arguments.write, "Make the edit; the original is kept beside");
         prepare->add_flag("--accept-loss", arguments.acceptLoss,
                           "Also edit lines that cannot keep their whole meaning");
+
+        AddMembership(arguments);
+        AddQuestions(arguments);
+        AddCAM(arguments);
     }
 
     /// @return the command to run; empty where `exitCode` is how it ends
@@ -100,11 +124,124 @@ public:
     }
 
     std::string Command() const {
-        auto const chosen = _app.get_subcommands();
-        return chosen.empty() ? std::string() : chosen.front()->get_name();
+        std::string command;
+        auto chosen = _app.get_subcommands();
+        while (!chosen.empty()) {
+            command += (command.empty() ? "" : " ") + chosen.front()->get_name();
+            chosen = chosen.front()->get_subcommands();
+        }
+        return command;
     }
 
 private:
+    void AddMembership(Arguments& arguments) {
+        auto* join =
+            AddAsking(_app, "join", "Join the host to a domain", arguments, [&](Output& output) {
+                return RunJoin(arguments.join, arguments.limit, output);
+            });
+        join->add_option("domain", arguments.join.domain,
+                         "The domain, and where its machine account is made")
+            ->type_name("DOMAIN[/OU]");
+        join->add_option("--cam", arguments.join.server,
+                         "Join through the CAM server at this IPv4 address, without an account")
+            ->check(NotEmpty)
+            ->type_name("SERVER");
+        join->add_option("--ou", arguments.join.unit, "With --cam: where the account is made")
+            ->type_name("OU");
+        join->add_flag("--skip-hostname-check", arguments.join.skipHostnameCheck,
+                       "Leave the host's name and name resolution alone");
+        AddAccount(*join, arguments.join.account);
+
+        auto* part = AddAsking(_app, "part", "Part the host from its domain", arguments,
+                               [&](Output& output) {
+                                   return RunPart(arguments.join.account, arguments.limit, output);
+                               });
+        AddAccount(*part, arguments.join.account);
+    }
+
+    void AddQuestions(Arguments& arguments) {
+        AddAsking(_app, "info", "Tell about the host's domain, the domains it trusts and the trust",
+                  arguments, [&](Output& output) { return RunInfo(arguments.limit, output); });
+        auto* dc =
+            AddAsking(_app, "dc", "Name a domain controller", arguments, [&](Output& output) {
+                return RunDC(arguments.name, arguments.limit, output);
+            });
+        auto* principal = AddAsking(
+            _app, "principal", "Name the host's principal in a domain", arguments,
+            [&](Output& output) { return RunPrincipal(arguments.name, arguments.limit, output); });
+        for (auto* command : {dc, principal}) {
+            command->add_option("domain", arguments.name, "The domain; the host's own if left out")
+                ->check(NotEmpty)
+                ->type_name("DOMAIN");
+        }
+        AddAsking(
+            _app, "canonical", "Tell under which name the host knows a user", arguments,
+            [&](Output& output) { return RunCanonical(arguments.name, arguments.limit, output); })
+            ->add_option("name", arguments.name, "A user's name")
+            ->required()
+            ->type_name("NAME");
+
+        auto* preferred = AddAsking(
+            _app, "preferred-dcs", "List the domain controllers that are asked first", arguments,
+            [&](Output& output) { return RunPreferredDCs(arguments.limit, output); });
+        preferred->require_subcommand(0, 1);
+        auto const set = [&](Output& output) {
+            return RunSetPreferredDCs(arguments.names, arguments.limit, output);
+        };
+        AddAsking(*preferred, "set", "Set them, in this order", arguments, set)
+            ->add_option("names", arguments.names, "Names of domain controllers")
+            ->required()
+            ->check(NotEmpty)
+            ->type_name("NAME");
+        AddAsking(*preferred, "clear", "Prefer none", arguments, set);
+    }
+
+    void AddCAM(Arguments& arguments) {
+        auto* cam = _app.add_subcommand("cam", "Pin the certificates of CAM servers, and ask them");
+        cam->footer(footer);
+        cam->require_subcommand(1);
+        auto* import = AddAsking(*cam, "import", "Pin the certificate that a server must present",
+                                 arguments, [&](Output& output) {
+                                     return RunCAMImport(arguments.server, arguments.file,
+                                                         arguments.limit, output);
+                                 });
+        auto* domain = AddAsking(*cam, "domain", "Tell which domain a server serves", arguments,
+                                 [&](Output& output) {
+                                     return RunCAMDomain(arguments.server, arguments.limit, output);
+                                 });
+        for (auto* command : {import, domain}) {
+            command->add_option("server", arguments.server, "The server's IPv4 address")
+                ->required()
+                ->type_name("SERVER");
+        }
+        import->add_option("file", arguments.file, "A certificate in PEM form")
+            ->required()
+            ->type_name("FILE");
+        Add(*cam, "list", "List the pinned certificates by their thumbprints", arguments,
+            [](Output& output) { return RunCAMList(output); });
+    }
+
+    /// Passwords are read and never given: arguments and environments are open to others.
+    static void AddAccount(CLI::App& command, AccountArguments& account) {
+        command.add_option("--user", account.user, "The account in whose name it is done")
+            ->type_name("NAME");
+        auto* input = command.add_flag("--password-stdin", account.password.standardInput,
+                                       "Read the password from the standard input");
+        auto* file = command
+                         .add_option("--password-file", account.password.file,
+                                     "Read it from a file that only its owner may read")
+                         ->check(NotEmpty)
+                         ->type_name("FILE")
+                         ->excludes(input);
+        command
+            .add_option("--password-fd", account.password.descriptor,
+                        "Read it from this open descriptor; the terminal is asked otherwise")
+            ->check(CLI::Range(0, std::numeric_limits<int>::max()).description(""))
+            ->type_name("N")
+            ->excludes(input)
+            ->excludes(file);
+    }
+
     static void AddCommon(CLI::App& app, Arguments& arguments) {
         app.add_flag("--json", arguments.json, "Write one JSON document (schema version 1)");
         app.add_option("--color", arguments.colour, "When to use colours: auto, always or never")
@@ -117,12 +254,34 @@ private:
             ->option_text("WHEN");
     }
 
-    CLI::App* Add(char const* name, char const* description, Arguments& arguments,
+    CLI::App* Add(CLI::App& parent, char const* name, char const* description, Arguments& arguments,
                   std::function<ExitCode(Output&)> run) {
-        auto* command = _app.add_subcommand(name, description);
+        auto* command = parent.add_subcommand(name, description);
         command->footer(footer);
         AddCommon(*command, arguments);
-        command->callback([this, run = std::move(run)] { _run = run; });
+        command->callback([this, command, run = std::move(run)] {
+            // A command's callback runs after that of a command below it, which is the one to run.
+            if (command->get_subcommands().empty()) {
+                _run = run;
+            }
+        });
+        return command;
+    }
+
+    CLI::App* Add(char const* name, char const* description, Arguments& arguments,
+                  std::function<ExitCode(Output&)> run) {
+        return Add(_app, name, description, arguments, std::move(run));
+    }
+
+    /// A command that has the provider or a server to wait for.
+    CLI::App* AddAsking(CLI::App& parent, char const* name, char const* description,
+                        Arguments& arguments, std::function<ExitCode(Output&)> run) {
+        auto* command = Add(parent, name, description, arguments, std::move(run));
+        command
+            ->add_option(Limit::Name, arguments.limit.seconds,
+                         "Seconds that an answer is waited for (60)")
+            ->check(CLI::Range(1, std::numeric_limits<int>::max()).description(""))
+            ->type_name("SECONDS");
         return command;
     }
 
@@ -178,7 +337,11 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     try {
-        return Run(argc, argv);
+        int const exitCode = Run(argc, argv);
+        if (HasAbandonedCalls()) {
+            _exit(exitCode); // everything has been written
+        }
+        return exitCode;
     } catch (std::exception const& e) {
         std::cerr << "tslauthctl: " << e.what() << '\n';
         return static_cast<int>(ExitCode::failure);

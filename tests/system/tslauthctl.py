@@ -5,6 +5,7 @@ import functools
 import json
 import os
 import pathlib
+import shutil
 import subprocess
 import sys
 import unittest
@@ -24,7 +25,8 @@ FILES = (PAM, NSS, RECORD)
 
 AD = "Active Directory"
 
-DONE, FAILURE, USAGE, NOT_ROOT, REFUSED, LOSS, DRIFT, CHANGES = range(8)
+(DONE, FAILURE, USAGE, NOT_ROOT, REFUSED, LOSS, DRIFT, CHANGES, UNREACHABLE, CREDENTIALS,
+ NOT_JOINED) = range(11)
 
 PLAIN_PAM = """#%PAM-1.0
 auth required /lib/security/$ISA/pam_access.so
@@ -65,6 +67,18 @@ def set_up(pam=PLAIN_PAM, nss=PLAIN_NSS, store="None", provider="example"):
     for path in FILES:
         os.chown(path, 0, 0)
         os.chmod(path, 0o644)
+
+
+SCRIPTS = pathlib.Path("/run/directed")
+
+
+def script(**entries):
+    """Makes the provider "directed" the host's, and tells it what to do; see directed.c."""
+    PROVIDER.write_text('provider = "directed"\n')
+    shutil.rmtree(SCRIPTS, ignore_errors=True)
+    SCRIPTS.mkdir()
+    for entry, text in entries.items():
+        (SCRIPTS / entry.replace("_", "-")).write_text(text)
 
 
 def state(paths=FILES):
