@@ -19,6 +19,7 @@ void AddNSSConfigurationCases(Table& table, Places const& places);
 void AddConfigurationCases(Table& table, Places const& places);
 void AddActiveDirectoryProviderCases(Table& table);
 void AddActiveDirectoryStoreCases(Table& table, Places const& places);
+void AddActiveDirectoryStoreQuestionsCases(Table& table);
 void AddTslauthctlCases(Table& table);
 
 } // namespace bench

@@ -34,6 +34,7 @@ int main(int count, char** values) {
     AddConfigurationCases(table, places);
     AddActiveDirectoryProviderCases(table);
     AddActiveDirectoryStoreCases(table, places);
+    AddActiveDirectoryStoreQuestionsCases(table);
     AddTslauthctlCases(table);
     if (observe) {
         table.Observe();
