@@ -12,6 +12,7 @@
 #include <cstdlib>
 #include <dirent.h>
 #include <filesystem>
+#include <malloc.h>
 #include <memory>
 #include <new>
 #include <random>
@@ -261,6 +262,32 @@ TEST_F(ActiveDirectoryStoreStressTest, HundredThousandQueriesKeepEveryPromise) {
     EXPECT_EQ(before.memory, after.memory);
 #endif
     EXPECT_FALSE(LoadedProvider::IsLoaded("erratic")) << "somebody still holds it";
+}
+
+TEST_F(ActiveDirectoryStoreStressTest, TenThousandStoresLeaveMemoryWhereItWas) {
+    auto const makeStores = [](int count) {
+        for (int i = 0; i < count; ++i) {
+            ActiveDirectoryStore const store(60);
+        }
+    };
+    makeStores(10); // the first one makes what stays
+    Resources const before;
+#if COUNTS_MEMORY
+    struct mallinfo2 const heapBefore = mallinfo2();
+#endif
+    makeStores(10000);
+#if COUNTS_MEMORY
+    struct mallinfo2 const heapAfter = mallinfo2();
+    // Also what does not come from `new`, such as the loader's.
+    EXPECT_EQ(heapBefore.uordblks, heapAfter.uordblks);
+#endif
+    Resources const after;
+    EXPECT_EQ(before.threads, after.threads);
+    EXPECT_EQ(before.descriptors, after.descriptors) << Descriptors();
+#if COUNTS_MEMORY
+    EXPECT_EQ(before.memory, after.memory);
+#endif
+    EXPECT_FALSE(LoadedProvider::IsLoaded(Provider));
 }
 
 TSLAUTH_AUTO_PTR_END
