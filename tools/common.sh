@@ -1,6 +1,9 @@
 # SPDX-License-Identifier: Apache-2.0
 # Shell code that the programs of this folder share. Sourced, never run.
 
+# One order of names and one language of messages, wherever this runs.
+export LC_ALL=C
+
 readonly tree=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
 readonly self=$tree/tools/${0##*/}
 

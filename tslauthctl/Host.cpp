@@ -58,8 +58,7 @@ ProviderEntries LoadProvider() {
 }
 
 std::optional<std::string> ReadPolicy(std::string const& name) {
-    std::string const folders[] = {"/etc/pam.d/", "/usr/lib/pam.d/"};
-    for (auto const& folder : folders) {
+    for (auto const* const folder : Paths::PAMPolicyFolders) {
         auto const path = !name.empty() && name.front() == '/' ? name : folder + name;
         try {
             return ReadFile(path);

@@ -7,6 +7,7 @@
 #include <tslauth/Configuration.h>
 #include <tslauth/Exceptions.h>
 
+#include <ConfigurationText.h>
 #include <Paths.h>
 #include <SystemFile.h>
 
@@ -35,17 +36,9 @@ void AddCommentNote(std::size_t before, std::size_t after, PlannedFile& file) {
     }
 }
 
-/// The keys and values of a configuration file, as its reader takes them.
 std::map<std::string, std::string> Assignments(std::string_view text) {
     std::map<std::string, std::string> assignments;
-    int number = 0;
-    for (auto line : Lines(text)) {
-        ++number;
-        line = line.substr(0, line.find('\n'));
-        if (line.find_first_not_of(" \t") != std::string_view::npos) {
-            assignments.insert(GetKeyValuePair(std::string(line), number));
-        }
-    }
+    ReadAssignments(text, assignments);
     return assignments;
 }
 
@@ -120,8 +113,10 @@ PlannedFile PlanRecord(std::string const& path, std::string const& text, std::st
     PlannedFile file{path, text, {}, {}, {}};
     auto wanted = Assignments(text);
     wanted[Paths::RemoteAuthenticationStoreKey] = store;
-    for (auto const& assignment : wanted) {
-        file.after += assignment.first + " = \"" + assignment.second + "\"\n";
+    std::string line;
+    for (auto const& [key, value] : wanted) {
+        AssignLine(line, {key, value});
+        file.after += line;
     }
     auto const made = Assignments(file.after);
     for (auto const& assignment : wanted) {

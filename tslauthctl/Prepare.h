@@ -32,8 +32,7 @@ struct Prepared {
 };
 
 /// @param acceptLoss also edit lines that cannot keep their meaning, where the library can carry
-/// the
-///        rest of them; what is lost stands in `impossible` all the same
+///        the rest of them; what is lost stands in `impossible` all the same
 Prepared PrepareNSS(std::string_view text, ProviderEntries const& provider, bool acceptLoss);
 Prepared PreparePAM(std::string_view text, ProviderEntries const& provider,
                     PAMPolicyReader const& reader, bool acceptLoss);

@@ -42,13 +42,15 @@ std::string KeepOriginal(std::string const& path) {
 std::string Write(std::string const& path, std::string const& text) {
     struct stat status = {};
     if (stat(path.c_str(), &status) != 0) {
-        ThrowIOError("Cannot open '" + path + "'", errno);
+        int const error = errno;
+        ThrowIOError("Cannot open '" + path + "'", error);
     }
     auto kept = KeepOriginal(path);
     ReplaceFile(path, text);
     if (status.st_uid != geteuid() || status.st_gid != getegid()) {
         if (chown(path.c_str(), status.st_uid, status.st_gid) != 0) {
-            ThrowIOError("Cannot give '" + path + "' its owner back", errno);
+            int const error = errno;
+            ThrowIOError("Cannot give '" + path + "' its owner back", error);
         }
     }
     return kept;

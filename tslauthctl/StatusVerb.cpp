@@ -115,9 +115,10 @@ ExitCode RunStatus(Output& output) {
     if (!isKnown || drifts(pam) || drifts(nss)) {
         return ExitCode::drift;
     }
-    // A host that wants no provider is well without one.
+    // A host that wants no provider is well without one. Where one is named, its entries may have
+    // been left in the files, and that nobody can tell is no good news.
     if (!entries) {
-        return wanted ? ExitCode::refused : ExitCode::done;
+        return wanted || !name.empty() ? ExitCode::refused : ExitCode::done;
     }
     bool const unread = pam == Agreement::unknown || nss == Agreement::unknown;
     return unread ? ExitCode::failure : ExitCode::done;

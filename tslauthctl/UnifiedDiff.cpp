@@ -61,6 +61,13 @@ void AppendShortest(LineList const& before, LineList const& after, std::vector<S
             ++a;
         }
     }
+    // Within a run of changes what goes stands before what comes, as readers know it.
+    for (auto step = steps.begin(); step != steps.end();) {
+        auto const isSame = [](Step const& any) { return any.sign == ' '; };
+        auto const start = std::find_if_not(step, steps.end(), isSame);
+        step = std::find_if(start, steps.end(), isSame);
+        std::stable_partition(start, step, [](Step const& any) { return any.sign == '-'; });
+    }
 }
 
 std::vector<Step> EditSteps(LineList const& before, LineList const& after) {

@@ -11,8 +11,7 @@ namespace StrandCtl {
 /// The text of a resolver configuration with `domain` in its search list; see `DnsConfigImpl` for
 /// where it goes, what stays as it is, and the limits.
 /// @throws HostCtl::Lib::HostCtlException if `domain` is no domain name, or the list would be
-/// longer
-///         than its limits
+///         longer than its limits
 std::string AddSearchDomainToText(std::string_view text, std::string const& domain);
 
 /// A program that keeps the resolver configuration, and would overwrite what others write there.

@@ -32,8 +32,7 @@ std::string Destination(std::string const& path);
 /// Not promised: extended attributes and access control lists are not carried over, and a target
 /// that is mounted on its own (a bind mount) cannot be replaced.
 /// @throws HostCtl::Lib::HostCtlException "Cannot replace '" + path + "': " + the reason; the
-/// target
-///         is as it was then, and the new file is gone
+///         target is as it was then, and the new file is gone
 void ReplaceFile(std::string const& path, std::string_view text);
 
 } // namespace StrandCtl

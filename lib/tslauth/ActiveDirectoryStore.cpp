@@ -175,6 +175,8 @@ SystemConfiguration::PAMEntry ActiveDirectoryStore::GetPAMEntryForProvider() con
 }
 
 void ActiveDirectoryStore::MakeActive() {
+    // Read, and the key found, before anything is written: a host whose record cannot be kept is
+    // left alone.
     AuthenticationConfiguration configuration;
     std::string& recorded = configuration[Paths::RemoteAuthenticationStoreKey];
     EditSystemFiles(ProviderModules::Edit::insert, GetPAMEntryForProvider(), *_provider);

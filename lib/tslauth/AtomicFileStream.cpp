@@ -42,6 +42,28 @@ void SyncDirectoryOf(std::string const& path) {
     (void)::close(opened);
 }
 
+/// Turns a stream's exceptions off for a scope: what they would report is checked, or is not meant
+/// to stop a commit half-way.
+class WithoutExceptions {
+public:
+    explicit WithoutExceptions(std::ios& stream) : _stream(stream), _mask(stream.exceptions()) {
+        _stream.exceptions(std::ios::goodbit);
+    }
+    WithoutExceptions(WithoutExceptions const&) = delete;
+    WithoutExceptions& operator=(WithoutExceptions const&) = delete;
+    ~WithoutExceptions() {
+        try {
+            _stream.exceptions(_mask);
+        } catch (std::ios::failure const&) {
+            // Setting the mask throws when the state is bad already, and has been set by then.
+        }
+    }
+
+private:
+    std::ios& _stream;
+    std::ios::iostate _mask;
+};
+
 } // namespace
 
 AtomicFileStream::AtomicFileStream(char const* path, std::ios::openmode mode) {
@@ -68,6 +90,8 @@ void AtomicFileStream::open(char const* path, std::ios::openmode mode) {
     (void)::close(created);
     _tempName = name;
     _targetName = path;
+    // What stays where the stream refuses a combination of modes without asking the system.
+    errno = EINVAL;
     if (rdbuf()->open(_tempName, mode | std::ios::out)) {
         clear();
     } else {
@@ -76,6 +100,7 @@ void AtomicFileStream::open(char const* path, std::ios::openmode mode) {
 }
 
 void AtomicFileStream::Sync() {
+    WithoutExceptions const quiet(*this);
     // A stream that failed before writes nothing here, and the error number is still that of the
     // failure. There is none when the stream's state was set by hand.
     flush();
@@ -94,6 +119,7 @@ void AtomicFileStream::Sync() {
 }
 
 void AtomicFileStream::Commit() {
+    WithoutExceptions const quiet(*this);
     if (!rdbuf()->close()) {
         // Not reported, and the rename goes on: only `Sync` vouches for the contents.
         setstate(std::ios::failbit);

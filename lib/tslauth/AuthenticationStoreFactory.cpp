@@ -13,15 +13,11 @@ namespace {
 /// Seconds that a store of the factory waits for its provider.
 constexpr int StoreTimeout = 60;
 
-template <typename Store> std::auto_ptr<AuthenticationStore> Constructor() {
-    return std::auto_ptr<AuthenticationStore>(new Store);
-}
+} // namespace
 
 template <> std::auto_ptr<AuthenticationStore> Constructor<ActiveDirectoryStore>() {
     return std::auto_ptr<AuthenticationStore>(new ActiveDirectoryStore(StoreTimeout));
 }
-
-} // namespace
 
 template <> AuthenticationStoreFactory* Singleton<AuthenticationStoreFactory>::_instance = nullptr;
 

@@ -9,6 +9,8 @@ namespace tessel::authentication::Paths {
 /// The PAM policy that follows the active store; other policies include it.
 inline constexpr char PAMPolicyName[] = "system-auth-generic";
 inline constexpr char PAMPolicy[] = "/etc/pam.d/system-auth-generic";
+/// Where libpam looks for a policy by its name, in this order.
+inline constexpr char const* PAMPolicyFolders[] = {"/etc/pam.d/", "/usr/lib/pam.d/"};
 inline constexpr char NSSConfiguration[] = "/etc/nsswitch.conf";
 
 inline constexpr char AuthenticationConfiguration[] = "/etc/tessel/tslauth/authentication.conf";
@@ -22,6 +24,8 @@ inline constexpr char ProviderSuffix[] = ".so";
 
 /// The module directory that the entries in the PAM policy name; libpam replaces "$ISA".
 inline constexpr char PAMModulePrefix[] = "/lib/security/$ISA/";
+/// The module of the access rules, in that directory: a provider's entry stands behind it.
+inline constexpr char PAMAccessModule[] = "pam_access.so";
 
 /// The key of `AuthenticationConfiguration` that records the active store's display name.
 inline constexpr char RemoteAuthenticationStoreKey[] = "remote-authentication-store";

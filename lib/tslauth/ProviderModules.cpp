@@ -14,9 +14,6 @@ using namespace SystemConfiguration;
 
 namespace {
 
-/// The entry that an access rule must be asked before any log-in: the provider's stands after it.
-constexpr char AccessModule[] = "pam_access.so";
-
 /// Room for what normalising and the edit add, so that the printed text is rarely moved.
 std::size_t RoomFor(std::string_view text) {
     return text.size() + text.size() / 8 + 256;
@@ -48,7 +45,7 @@ NSSService NSSServiceFor(std::string const& module, std::list<std::string> const
 }
 
 void Apply(Edit edit, PAMEntry const& entry, PAMPolicy& policy) {
-    std::string const access = std::string(Paths::PAMModulePrefix) + AccessModule;
+    std::string const access = std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule;
     for (auto const facility : {PAMFacility::auth, PAMFacility::account}) {
         switch (edit) {
         case Edit::insert: {

@@ -15,6 +15,8 @@ namespace tessel::authentication {
 // Also in 32 bits: otherwise a file system with large inode numbers makes `stat` fail with
 // EOVERFLOW for a file of any size. The definition stands in the project's compiler options.
 static_assert(sizeof(off_t) == 8, "compile with _FILE_OFFSET_BITS=64");
+// Likewise for a file with a time after January 2038.
+static_assert(sizeof(time_t) == 8, "compile with _TIME_BITS=64");
 
 namespace {
 

@@ -138,7 +138,9 @@ TEST_F(ActiveDirectoryStoreAnswersTest, TrustedDomainsThatThrowReachTheWaiterAsA
     for (ScriptedAct const failure : Throws) {
         Let(ScriptedTrustedDomains, failure);
         EXPECT_THROW(_store->GetTrustedDomains(), InternalErrorException) << failure;
-        EXPECT_EQ(InternalError, Host::FailureOf([&] { _store->GetTrustedDomains(); })) << failure;
+        EXPECT_EQ(std::string("InternalErrorException: ") + InternalError,
+                  Host::FailureOf([&] { _store->GetTrustedDomains(); }))
+            << failure;
     }
     Let(ScriptedTrustedDomains, ScriptedAnswers);
     EXPECT_EQ(1U, _store->GetTrustedDomains().size());

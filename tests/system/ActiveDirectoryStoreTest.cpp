@@ -78,7 +78,7 @@ TEST_F(ActiveDirectoryStoreTest, ProviderThatIsNotChosenIsUnset) {
     for (char const* text : {"provider = \"\"\n", "provider =\n", "other = \"plain\"\n", ""}) {
         Host::Write(Paths::ProviderConfiguration, text);
         EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException) << text;
-        EXPECT_EQ("The specified Active Directory provider '(unset)' is invalid",
+        EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider '(unset)' is invalid",
                   ConstructionFailure())
             << text;
     }
@@ -87,27 +87,27 @@ TEST_F(ActiveDirectoryStoreTest, ProviderThatIsNotChosenIsUnset) {
 TEST_F(ActiveDirectoryStoreTest, MissingProviderConfigurationMeansNoneInstalled) {
     ASSERT_EQ(0, unlink(Paths::ProviderConfiguration));
     EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException);
-    EXPECT_EQ("The specified Active Directory provider '(none installed)' is invalid",
+    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider '(none installed)' is invalid",
               ConstructionFailure());
 }
 
 TEST_F(ActiveDirectoryStoreTest, MalformedProviderConfigurationIsAConfigurationError) {
     Host::Write(Paths::ProviderConfiguration, "provider = \"\nplain");
     EXPECT_THROW(ActiveDirectoryStore(60), ConfigurationError);
-    EXPECT_EQ("Error parsing configuration at line 1: invalid quoting", ConstructionFailure());
+    EXPECT_EQ("ConfigurationError: Error parsing configuration at line 1: invalid quoting", ConstructionFailure());
 }
 
 TEST_F(ActiveDirectoryStoreTest, ProviderThatDoesNotLoadPassesItsOwnExceptionThrough) {
     Host::Write(Paths::ProviderConfiguration, "provider = absent\n");
     EXPECT_THROW(ActiveDirectoryStore(60), IOError);
-    EXPECT_EQ("Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared "
+    EXPECT_EQ("IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared "
               "object file" +
                   NoFile,
               ConstructionFailure());
 
     Host::Write(Paths::ProviderConfiguration, "provider = too-new\n");
     EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException);
-    EXPECT_EQ("The specified Active Directory provider 'too-new' is invalid: The API version (3) "
+    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider 'too-new' is invalid: The API version (3) "
               "is not supported by this version of libtslauth",
               ConstructionFailure());
 }
@@ -282,7 +282,7 @@ TEST_F(ActiveDirectoryStoreTest, RecordIsReadBeforeAnythingIsWritten) {
     }
     ASSERT_EQ(0, unlink(Paths::AuthenticationConfiguration));
     before = Host::Snapshot();
-    EXPECT_EQ("Unable to open '/etc/tessel/tslauth/authentication.conf'" + NoFile,
+    EXPECT_EQ("IOError: Unable to open '/etc/tessel/tslauth/authentication.conf'" + NoFile,
               ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
 }
@@ -291,13 +291,13 @@ TEST_F(ActiveDirectoryStoreTest, MissingPolicyIsAnIOErrorAndNothingIsCreated) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     auto const before = Host::Snapshot();
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("Cannot open '/etc/pam.d/system-auth-generic'" + NoFile, ActivationFailure());
+    EXPECT_EQ("IOError: Cannot open '/etc/pam.d/system-auth-generic'" + NoFile, ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
 }
 
 TEST_F(ActiveDirectoryStoreTest, MissingSwitchLeavesThePolicyChangedAndTheRecordAsItWas) {
     ASSERT_EQ(0, unlink(Paths::NSSConfiguration));
-    EXPECT_EQ("Cannot open '/etc/nsswitch.conf'" + NoFile, ActivationFailure());
+    EXPECT_EQ("IOError: Cannot open '/etc/nsswitch.conf'" + NoFile, ActivationFailure());
     EXPECT_EQ(ActivePolicy, Host::Read(Paths::PAMPolicy));
     EXPECT_NE(0, access(Paths::NSSConfiguration, F_OK));
     EXPECT_EQ("remote-authentication-store = \"None\"\n",
@@ -309,14 +309,14 @@ TEST_F(ActiveDirectoryStoreTest, PolicyThatTheModelRefusesStaysAsItIs) {
         char const* text;
         char const* message;
     } const cases[] = {
-        {"@include common-auth\n", "Invalid Facility: @include"},
-        {"-session optional pam_systemd.so\n", "Invalid Facility: -session"},
-        {"auth Required pam_unix.so\n", "Invalid Control: Required"},
-        {"auth required pam_unix.so \\\n  nullok\n", "Invalid Facility: nullok"},
-        {"auth", "Invalid Control: "},
+        {"@include common-auth\n", "InvalidFacilityException: Invalid Facility: @include"},
+        {"-session optional pam_systemd.so\n", "InvalidFacilityException: Invalid Facility: -session"},
+        {"auth Required pam_unix.so\n", "InvalidControlException: Invalid Control: Required"},
+        {"auth required pam_unix.so \\\n  nullok\n", "InvalidFacilityException: Invalid Facility: nullok"},
+        {"auth", "InvalidControlException: Invalid Control: "},
         {"\x7f"
          "ELF\x01",
-         "Invalid Facility: \x7f"
+         "InvalidFacilityException: Invalid Facility: \x7f"
          "ELF\x01"},
     };
     for (auto const& refused : cases) {
@@ -334,11 +334,11 @@ TEST_F(ActiveDirectoryStoreTest, SwitchThatTheModelRefusesStaysAsItIs) {
         char const* text;
         char const* message;
     } const cases[] = {
-        {"gshadow: files\n", "Invalid Database: gshadow"},
-        {" # indented\n", "Invalid Database: "},
-        {"passwd : files\n", "Invalid Database: passw"},
-        {"passwd: files\r\n", "basic_string::at"},
-        {"passwd: files \n", "basic_string::at"},
+        {"gshadow: files\n", "InvalidDatabaseException: Invalid Database: gshadow"},
+        {" # indented\n", "InvalidDatabaseException: Invalid Database: "},
+        {"passwd : files\n", "InvalidDatabaseException: Invalid Database: passw"},
+        {"passwd: files\r\n", "out_of_range: basic_string::at"},
+        {"passwd: files \n", "out_of_range: basic_string::at"},
     };
     for (auto const& refused : cases) {
         Host::Write(Paths::NSSConfiguration, std::string("hosts: files\n") + refused.text);
@@ -414,11 +414,11 @@ TEST_F(ActiveDirectoryStoreTest, UnreadableFileIsNamedAndNothingChanges) {
         char const* path;
         char const* message;
     } const cases[] = {
-        {Paths::PAMPolicy, "Cannot open '/etc/pam.d/system-auth-generic': Permission denied"},
+        {Paths::PAMPolicy, "IOError: Cannot open '/etc/pam.d/system-auth-generic': Permission denied"},
         {Paths::AuthenticationConfiguration,
-         "Unable to open '/etc/tessel/tslauth/authentication.conf': Permission denied"},
+         "IOError: Unable to open '/etc/tessel/tslauth/authentication.conf': Permission denied"},
         {Paths::ProviderConfiguration,
-         "The specified Active Directory provider '(none installed)' is invalid"},
+         "InvalidActiveDirectoryProviderException: The specified Active Directory provider '(none installed)' is invalid"},
     };
     auto const before = Host::Snapshot();
     for (auto const& unreadable : cases) {
@@ -443,7 +443,7 @@ TEST_F(ActiveDirectoryStoreTest, UnreadableFileIsNamedAndNothingChanges) {
     }
     ASSERT_EQ(0, chmod(Paths::NSSConfiguration, 0644));
     ASSERT_EQ(0, chown("/etc/pam.d", 0, 0));
-    EXPECT_EQ("Cannot open '/etc/nsswitch.conf': Permission denied", failure);
+    EXPECT_EQ("IOError: Cannot open '/etc/nsswitch.conf': Permission denied", failure);
     EXPECT_EQ(before.at(Paths::NSSConfiguration), Host::Read(Paths::NSSConfiguration));
 }
 
@@ -492,11 +492,11 @@ TEST_F(ActiveDirectoryStoreTest, BadRecordStopsTheActivationBeforeItBegins) {
         std::string text;
         char const* message;
     } const cases[] = {
-        {"", "The specified key 'remote-authentication-store' was not found in this configuration"},
-        {Binary, "Error parsing configuration on line 1: no delimiter found"},
+        {"", "InvalidKeyException: The specified key 'remote-authentication-store' was not found in this configuration"},
+        {Binary, "ConfigurationError: Error parsing configuration on line 1: no delimiter found"},
         {ManyAssignments() + "x\n",
-         "Error parsing configuration on line 100001: no delimiter found"},
-        {LongAssignment() + "x = '", "Error parsing configuration at line 2: invalid quoting"},
+         "ConfigurationError: Error parsing configuration on line 100001: no delimiter found"},
+        {LongAssignment() + "x = '", "ConfigurationError: Error parsing configuration at line 2: invalid quoting"},
     };
     for (auto const& bad : cases) {
         Host::Write(Paths::AuthenticationConfiguration, bad.text);
@@ -519,14 +519,14 @@ TEST_F(ActiveDirectoryStoreTest, BadProviderConfigurationIsReportedWithItsText) 
         std::string text;
         char const* message;
     } const cases[] = {
-        {Binary, "Error parsing configuration on line 1: no delimiter found"},
+        {Binary, "ConfigurationError: Error parsing configuration on line 1: no delimiter found"},
         {"provider = \"plain\"\r\n",
-         "Unable to open provider: /usr/libexec/tslauth/lib\"plain\"\r.so: cannot open shared "
+         "IOError: Unable to open provider: /usr/libexec/tslauth/lib\"plain\"\r.so: cannot open shared "
          "object file: No such file or directory"},
         {ManyAssignments() + "provider =\n",
-         "The specified Active Directory provider '(unset)' is invalid"},
+         "InvalidActiveDirectoryProviderException: The specified Active Directory provider '(unset)' is invalid"},
         {LongAssignment() + ManyAssignments() + "provider = absent",
-         "Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared object "
+         "IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared object "
          "file: No such file or directory"},
     };
     for (auto const& bad : cases) {
@@ -540,7 +540,7 @@ TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     ASSERT_EQ(0, mkdir(Paths::PAMPolicy, 0755));
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("Cannot read '/etc/pam.d/system-auth-generic': Is a directory", ActivationFailure());
+    EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': Is a directory", ActivationFailure());
     ASSERT_EQ(0, rmdir(Paths::PAMPolicy));
 }
 
@@ -550,7 +550,7 @@ TEST_F(ActiveDirectoryStoreTest, FolderThatCannotBeWrittenLeavesThePolicyAsItWas
     ASSERT_EQ(0,
               mount(nullptr, folder.c_str(), nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr));
     auto const before = Host::Snapshot();
-    EXPECT_EQ("Unable to create temporary file to write '/etc/pam.d/system-auth-generic': "
+    EXPECT_EQ("IOError: Unable to create temporary file to write '/etc/pam.d/system-auth-generic': "
               "Read-only file system",
               ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
@@ -568,7 +568,7 @@ TEST_F(ActiveDirectoryStoreTest, FullDiskLeavesThePolicyAsItWas) {
     Host::Write("/etc/pam.d/filler", std::string(4096, 'x'));
     auto const before = Host::Snapshot();
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("Cannot write '/etc/pam.d/system-auth-generic': No space left on device",
+    EXPECT_EQ("IOError: Cannot write '/etc/pam.d/system-auth-generic': No space left on device",
               ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
 }
@@ -576,7 +576,7 @@ TEST_F(ActiveDirectoryStoreTest, FullDiskLeavesThePolicyAsItWas) {
 TEST_F(ActiveDirectoryStoreTest, FileThatCannotBeMovedIntoPlaceLeavesTheOldOne) {
     Mount(Paths::NSSConfiguration, Paths::NSSConfiguration, nullptr, MS_BIND, nullptr);
     std::string const failure = ActivationFailure();
-    EXPECT_EQ(0U, failure.find("Unable to rename '/etc/nsswitch.conf.")) << failure;
+    EXPECT_EQ(0U, failure.find("IOError: Unable to rename '/etc/nsswitch.conf.")) << failure;
     EXPECT_NE(std::string::npos, failure.find("' to '/etc/nsswitch.conf': Device or resource busy"))
         << failure;
     EXPECT_EQ(Host::Switch, Host::Read(Paths::NSSConfiguration));

@@ -61,7 +61,7 @@ protected:
 TEST_F(ActiveDirectoryStoreThreadsTest, ConfigurationWithoutAThreadFailsOnceAndIsAskedForAgain) {
     for (int i = 0; i < 2; ++i) {
         FailToCreate(EAGAIN);
-        EXPECT_EQ("Thread Error: ate failed. RC=",
+        EXPECT_EQ("ThreadErrorException: Thread Error: ate failed. RC=",
                   Host::FailureOf([&] { ConfigurationOf(*_patient); }));
     }
     EXPECT_EQ(0U, Calls());
@@ -85,10 +85,11 @@ TEST_F(ActiveDirectoryStoreThreadsTest, StoreIsReleasedWhenItsWorkerCannotBeStar
 TEST_F(ActiveDirectoryStoreThreadsTest, WaitThatFailsReachesTheCallerAndTheWorkerGoesOn) {
     Close();
     waitError = EINVAL;
-    EXPECT_EQ("Thread Error:  failed. RC=",
+    EXPECT_EQ("ThreadErrorException: Thread Error:  failed. RC=",
               Host::FailureOf([&] { _patient->GetTrustedDomains(); }));
     waitError = EINVAL;
-    EXPECT_EQ("Thread Error:  failed. RC=", Host::FailureOf([&] { ConfigurationOf(*_patient); }));
+    EXPECT_EQ("ThreadErrorException: Thread Error:  failed. RC=",
+              Host::FailureOf([&] { ConfigurationOf(*_patient); }));
     Await([](Gate const& it) { return it.inside == 2; });
     // Both still run: answered from the cache, without a wait that could fail.
     waitError = EINVAL;
@@ -126,7 +127,7 @@ TEST_F(ActiveDirectoryStoreThreadsTest, TrustStateWithoutAThreadFailsOnceAndIsAs
     _impatient->GetTrustedDomains();
     for (int i = 0; i < 2; ++i) {
         FailToCreate(EAGAIN);
-        EXPECT_EQ("Thread Error: ate failed. RC=",
+        EXPECT_EQ("ThreadErrorException: Thread Error: ate failed. RC=",
                   Host::FailureOf([&] { _patient->GetDomainTrustState(); }));
     }
     Open();
@@ -153,7 +154,7 @@ TEST_F(ActiveDirectoryStoreThreadsTest, TrustedDomainsWithoutAThreadAreNeverAske
     Await([](Gate const& it) { return it.inside == 1; });
     AwaitWorkers(1);
     FailToCreate(EAGAIN);
-    EXPECT_EQ("Thread Error: ate failed. RC=",
+    EXPECT_EQ("ThreadErrorException: Thread Error: ate failed. RC=",
               Host::FailureOf([&] { _patient->GetTrustedDomains(); }));
     Change([](Gate& it) { it.domainsOpen = 0; });
 

@@ -7,6 +7,7 @@
 
 #include <tslauth/Exception.h>
 
+#include <boost/core/demangle.hpp>
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -75,12 +76,14 @@ constexpr char Switch[] = "# name-service switch\n"
                           "group:   files\n"
                           "shadow:  files\n";
 
-/// A failure of the library, for one comparison: class name and text.
+/// A failure for one comparison: its class without namespaces, ": " and its text.
 template <typename Call> std::string FailureOf(Call call) {
     try {
         call();
     } catch (std::exception const& failure) {
-        return failure.what();
+        std::string const name = boost::core::demangle(typeid(failure).name());
+        std::string::size_type const colon = name.rfind(':');
+        return (colon == std::string::npos ? name : name.substr(colon + 1)) + ": " + failure.what();
     }
     return "(none)";
 }

@@ -34,7 +34,7 @@ TEST_F(RemoteAuthenticationStoreTest, MissingFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::AuthenticationConfiguration));
     NoRemoteAuthenticationStore const none;
     EXPECT_THROW(none.IsActive(), IOError);
-    EXPECT_EQ("Unable to open '/etc/tessel/tslauth/authentication.conf': No such file or directory",
+    EXPECT_EQ("IOError: Unable to open '/etc/tessel/tslauth/authentication.conf': No such file or directory",
               Host::FailureOf([&] { none.IsActive(); }));
 }
 
@@ -42,7 +42,7 @@ TEST_F(RemoteAuthenticationStoreTest, MalformedLineIsAConfigurationError) {
     Host::Write(Paths::AuthenticationConfiguration, "\n\n# none\n");
     NoRemoteAuthenticationStore const none;
     EXPECT_THROW(none.IsActive(), ConfigurationError);
-    EXPECT_EQ("Error parsing configuration on line 3: no delimiter found",
+    EXPECT_EQ("ConfigurationError: Error parsing configuration on line 3: no delimiter found",
               Host::FailureOf([&] { none.IsActive(); }));
 }
 
@@ -50,6 +50,6 @@ TEST_F(RemoteAuthenticationStoreTest, MissingKeyIsNotAnsweredWithFalse) {
     Host::Write(Paths::AuthenticationConfiguration, "other = \"None\"\n");
     NoRemoteAuthenticationStore const none;
     EXPECT_THROW(none.IsActive(), InvalidKeyException);
-    EXPECT_EQ("The specified key 'remote-authentication-store' was not found in this configuration",
+    EXPECT_EQ("InvalidKeyException: The specified key 'remote-authentication-store' was not found in this configuration",
               Host::FailureOf([&] { none.IsActive(); }));
 }

@@ -343,8 +343,9 @@ class Status(Case):
         self.assertEqual((DRIFT, False), (document["exit"], document["known"]))
 
     def test_without_its_provider_it_cannot_be_told(self):
-        for store, code in ((AD, REFUSED), ("None", DONE)):
-            set_up(store=store, provider="gone")
+        for store, provider, code in ((AD, "gone", REFUSED), ("None", "gone", REFUSED),
+                                      ("None", "", DONE)):
+            set_up(store=store, provider=provider)
             document = self.unchanged("status")
             self.assertEqual(code, document["exit"])
             self.assertFalse(document["provider"]["loaded"])

@@ -4,6 +4,7 @@
 #include "../TemporaryFolder.h"
 
 #include <cerrno>
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <memory>
 #include <sys/stat.h>
@@ -302,6 +303,36 @@ TEST_F(AtomicFileStreamTest, SyncOfAFailureWithoutAReasonCallsItAnIOError) {
     stream.setstate(std::ios::failbit);
     errno = 0;
     EXPECT_EQ("Cannot write '" + target + "': Input/output error", SyncError(stream));
+}
+
+TEST_F(AtomicFileStreamTest, SyncSaysThatTheStreamDoesNotKnowTheMode) {
+    errno = ENOTTY;
+    AtomicFileStream stream(target.c_str(), std::ios::app | std::ios::trunc);
+    EXPECT_EQ("Cannot write '" + target + "': Invalid argument", SyncError(stream));
+}
+
+TEST_F(AtomicFileStreamTest, ExceptionMaskOfTheStreamDoesNotStopACommit) {
+    SetContents(target, "old");
+    AtomicFileStream stream(target.c_str(), std::ios::out);
+    stream.exceptions(std::ios::failbit | std::ios::badbit);
+    stream << "new";
+    stream.rdbuf()->close();
+    // The stream has nothing to close any more, which sets its fail state and is not reported.
+    EXPECT_EQ("", CommitError(stream));
+    EXPECT_TRUE(stream.fail());
+    EXPECT_EQ("new", Contents(target));
+    EXPECT_EQ(std::ios::failbit | std::ios::badbit, stream.exceptions());
+    errno = 0;
+    EXPECT_EQ("Cannot write '" + target + "': Input/output error", SyncError(stream));
+}
+
+TEST_F(AtomicFileStreamTest, FileWithATimeBeyond2038KeepsItsMode) {
+    SetContents(target, "old");
+    ASSERT_EQ(0, ::chmod(target.c_str(), 0644));
+    timespec const times[2] = {{4000000000, 0}, {4000000000, 0}};
+    ASSERT_EQ(0, ::utimensat(AT_FDCWD, target.c_str(), times, 0));
+    Replace("new");
+    EXPECT_EQ(0644U, ModeOf(target));
 }
 
 TEST_F(AtomicFileStreamTest, SyncAfterCommitIsRefused) {

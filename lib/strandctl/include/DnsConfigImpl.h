@@ -45,9 +45,8 @@ public:
     /// symbolic link, it is the file it leads to that is replaced. Blocks as long as the file
     /// system does.
     /// @throws HostCtl::Lib::HostCtlException if a program that would overwrite the change keeps
-    /// the
-    ///         file (it is a link into "/run", or its first comments say so); the text names the
-    ///         owner and what to do instead
+    ///         the file (it is a link into "/run", or its first comments say so); the text names
+    ///         the owner and what to do instead
     /// @throws HostCtl::Lib::HostCtlException if the list has become too long in the meantime, or
     ///         the file cannot be read or replaced; in every case the file is as it was
     void SaveConfig();

@@ -19,8 +19,7 @@ public:
     /// The root of the host's advanced options, read from "/etc/tessel/advanced.conf" now. A line
     /// of the file is an option, as in `UserVars.Example = "1"`.
     /// @throws HostCtl::Lib::HostCtlException "Unable to get root option branch" if there is no
-    /// such
-    ///         file; the same text + ": " + the reason if it cannot be read or has a bad line
+    ///         such file; the same text + ": " + the reason if it cannot be read or has a bad line
     Adv::AdvancedOptionBranch GetAdvancedOptionRoot() const;
 };
 

@@ -58,8 +58,7 @@ public:
     /// comments and blank lines do not survive. Blocks for the disk; asks the provider nothing.
     ///
     /// @throws IOError where a file cannot be read or replaced; `authentication.conf` is read
-    /// first,
-    ///     so that a host without it stays untouched
+    ///     first, so that a host without it stays untouched
     /// @throws ConfigurationError, InvalidKeyException where `authentication.conf` is malformed
     /// @throws FilePermissionError where a file was replaced but its permissions may be wrong
     /// @throws SystemConfiguration::InvalidFacilityException,
@@ -128,8 +127,7 @@ public:
     ///     texts are handed to the provider without a copy
     /// @throws InvalidCredentialsException where either is missing; nothing has been done then
     /// @throws InvalidHostNameException where the host's name is too long (more than 63 bytes),
-    /// does
-    ///     not resolve, resolves to another short name, or is one of "localhost", "linux" and
+    ///     does not resolve, resolves to another short name, or is one of "localhost", "linux" and
     ///     "hostname"
     /// @throws HostCtl::Lib::HostCtlException where the hosts file, the DNS configuration or the
     ///     management interface cannot be read or changed
@@ -151,7 +149,8 @@ public:
     /// @throws FileNotFoundException (code 2) if the certificate's file cannot be opened
     /// @throws InvalidCertificateException if it holds no certificate in PEM form
     /// @throws InvalidThumbprintStoreException if the store cannot be opened or replaced; it is not
-    ///     created where it does not exist
+    ///     created where it does not exist. Also if it was replaced but may have the wrong
+    ///     permissions; the thumbprint stands in it then
     /// @throws ConfigurationError where a line of the store is malformed
     void ImportCertificateForCAM(std::string const& certificateFile,
                                  std::string const& serverAddress);
@@ -166,8 +165,7 @@ public:
     /// files.
     ///
     /// @param serverAddress as for `ImportCertificateForCAM`. A server without a pinned thumbprint
-    /// is
-    ///     asked all the same; to accept it or not is the CAM provider's decision
+    ///     is asked all the same; to accept it or not is the CAM provider's decision
     /// @param organisationalUnit for the machine account; empty leaves it to the server
     /// @param skipHostnameCheck leaves the host's name and name resolution alone; see `JoinDomain`
     /// @throws InvalidIPAddressException before anything else is done
@@ -182,8 +180,7 @@ public:
     /// @throws InvalidThumbprintStoreException where the thumbprints cannot be read
     /// @throws ConfigurationError where a line of either file is malformed
     /// @throws what `CAMProxy`'s operations throw, `InvalidCAMCertificateException` among it, and
-    /// the
-    ///     provider's failure
+    ///     the provider's failure
     void JoinDomainWithCAM(std::string const& serverAddress, std::string const& organisationalUnit,
                            bool skipHostnameCheck);
 

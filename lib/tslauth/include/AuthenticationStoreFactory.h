@@ -13,7 +13,18 @@
 namespace tessel {
 namespace authentication {
 
+class ActiveDirectoryStore;
 class AuthenticationStoreFactory;
+
+TSLAUTH_AUTO_PTR_BEGIN
+/// What `RegisterType` takes: `&Constructor<Store>` makes a `Store` with its default constructor.
+template <typename Store> std::auto_ptr<AuthenticationStore> Constructor() {
+    return std::auto_ptr<AuthenticationStore>(new Store);
+}
+
+/// A store that waits 60 seconds for its provider's answers.
+template <> TSLAUTH_EXPORT std::auto_ptr<AuthenticationStore> Constructor<ActiveDirectoryStore>();
+TSLAUTH_AUTO_PTR_END
 
 /// The pointer's one home is the library, so that a program and its plug-ins see the same factory.
 template <>

@@ -36,8 +36,8 @@ public:
     /// asked yet.
     /// @param serverAddress handed to the provider as it is
     /// @param verifyCertificate whether the provider is to verify the server's certificate
-    /// @param thumbprint of the certificate that the server is expected to present; empty if
-    /// unknown
+    /// @param thumbprint of the certificate that the server is expected to present; empty if it is
+    ///     not known
     /// @throws IOError "Unable to open CAM provider: " + the loader's text, if it cannot be loaded
     /// @throws InvalidCAMProxyProviderException with the loader's text, if it lacks its record; it
     ///     has been unloaded again then

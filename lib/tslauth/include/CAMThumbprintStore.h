@@ -27,8 +27,7 @@ public:
 
     /// Makes `thumbprint` the one of `server`, and writes the file if that changes anything.
     /// @throws IOError, FilePermissionError as `Write`; the file is then as `Write` leaves it,
-    /// while
-    ///         this object already has the new thumbprint
+    ///         while this object already has the new thumbprint
     void ImportThumbprint(std::string const& thumbprint, std::string const& server);
 };
 

@@ -177,8 +177,8 @@ TSLAUTH_CODED_EXCEPTION(RPCSProtocolSequenceNotSupportedException);
 /// @name The loaded provider does not offer the call, or answered with a number of its own.
 /// @{
 
-/// 120: "This function is not supported on this system." The stores answer it with a neutral value
-/// and do not pass it on.
+/// 120: "This function is not supported on this system." A store's questions are answered with a
+/// neutral value instead; joining and parting pass it on.
 class TSLAUTH_EXPORT CallNotImplementedException : public Exception {
 public:
     CallNotImplementedException();

@@ -9,9 +9,9 @@
 namespace tessel {
 namespace authentication {
 
-/// Closes what `dlopen` returned.
+/// Closes what `dlopen` returned. Only the adapters do, so that only the type is exported.
 struct TSLAUTH_EXPORT LibraryCloser {
-    void operator()(void* library) const noexcept;
+    __attribute__((visibility("hidden"))) void operator()(void* library) const noexcept;
 };
 
 /// A provider's library, loaded as long as its handle lives; empty where there is none. It is a

@@ -17,9 +17,9 @@ public:
     ///
     /// An exception that leaves `call` ends the process: it has to report its own failures.
     /// @throws ThreadErrorException where no thread can be created; then the copy has been
-    /// released.
-    ///     Its message is "Thread Error: " + "pthread_create failed. RC=" without as many leading
-    ///     characters as the error number (pthread_create(3)) says; support tools know the texts.
+    ///     released. Its message is "Thread Error: " + "pthread_create failed. RC=" without as many
+    ///     leading characters as the error number (pthread_create(3)) says; support tools know the
+    ///     texts.
     static void ScheduleThread(boost::function<void()> call);
 };
 

@@ -70,6 +70,11 @@ TEST(UnifiedDiffTest, AMissingLastLineFeedIsTold) {
               UnifiedDiff("f", "a", "a\n"));
 }
 
+TEST(UnifiedDiffTest, WhatGoesStandsBeforeWhatComes) {
+    EXPECT_EQ("--- f\n+++ f\n@@ -1,4 +1,5 @@\n 0\n-a\n-b\n+x\n+y\n+z\n 1\n",
+              UnifiedDiff("f", "0\na\nb\n1\n", "0\nx\ny\nz\n1\n"));
+}
+
 TEST(UnifiedDiffTest, DistantChangesAreHunksOfTheirOwn) {
     std::string before;
     for (int i = 0; i < 20; ++i) {
