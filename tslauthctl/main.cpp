@@ -62,7 +62,7 @@ std::string NotEmpty(std::string const& text) {
 class Parser {
 public:
     explicit Parser(Arguments& arguments)
-        : _app("Activate and inspect the authentication store of this host.", "tslauthctl") {
+        : _app("The authentication store of this host, and its domain.", "tslauthctl") {
         _app.set_version_flag("--version", "tslauthctl " TSLAUTH_VERSION);
         _app.require_subcommand(1);
         _app.footer(footer);
