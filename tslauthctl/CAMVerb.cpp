@@ -54,7 +54,10 @@ ExitCode RunCAMList(Output& output) {
         Explaining(Account::none, [] { return CAMThumbprintStore(Paths::CAMThumbprintStore); });
     for (auto const& [server, thumbprint] : pinned) {
         servers.push_back({{"server", server}, {"thumbprint", thumbprint}});
-        output.Line(server + " " + thumbprint);
+        auto line = server;
+        line += " ";
+        line += thumbprint;
+        output.Line(line);
     }
     return ExitCode::done;
 }

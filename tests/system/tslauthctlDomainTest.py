@@ -5,6 +5,7 @@ through one that fails and hangs as it is told."""
 
 import os
 import pathlib
+import re
 import shutil
 import signal
 import subprocess
@@ -35,6 +36,18 @@ def nobody():
 
 def command(*line):
     subprocess.run(line, check=True, timeout=60, capture_output=True)
+
+
+def wait_until_caught(process, number):
+    """Until the process has a handler for the signal."""
+    status = pathlib.Path(f"/proc/{process.pid}/status")
+    end = time.monotonic() + 30
+    while time.monotonic() < end:
+        caught = int(re.search(r"^SigCgt:\s*(\w+)", status.read_text(), re.M)[1], 16)
+        if caught & 1 << number - 1:
+            return
+        time.sleep(0.01)
+    raise AssertionError("the signal is not caught")
 
 
 def certificate(path, name="cam.example.test"):
@@ -228,7 +241,7 @@ class Failures(Case):
         document = self.fails(UNREACHABLE, None, "info", "--timeout", "1")
         took = time.monotonic() - begin
         self.assertGreaterEqual(took, 1)
-        self.assertLess(took, 1.9)
+        self.assertLess(took, 2.9)  # and not one after the other
         self.assertEqual([("--timeout", 1)] * 3, [(expired["limit"], expired["seconds"])
                                                   for expired in document["expired"]])
         for key in ("joined", "domain", "machine_account", "preferred_domain_controllers",
@@ -307,11 +320,9 @@ class Failures(Case):
         for number in (signal.SIGINT, signal.SIGTERM, signal.SIGHUP):
             process = subprocess.Popen([TOOL, "part"], stdout=subprocess.PIPE,
                                        stderr=subprocess.PIPE)
-            time.sleep(0.3)
-            begin = time.monotonic()
+            wait_until_caught(process, number)
             process.send_signal(number)
             output, errors = process.communicate(timeout=30)
-            self.assertLess(time.monotonic() - begin, 1)
             self.assertEqual((-number, b""), (process.returncode, output))
             self.assertEqual(b"tslauthctl: interrupted while waiting for the provider to part the "
                              b"host from its domain\n", errors)
