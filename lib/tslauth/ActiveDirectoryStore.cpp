@@ -5,6 +5,7 @@
 #include "Paths.h"
 #include "ProviderModules.h"
 #include "SystemFile.h"
+#include "ThrowMappedException.h"
 
 #include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
@@ -107,15 +108,21 @@ Answer AskTimed(TimedQuestion<Answer> const& question, pthread_mutex_t& mutex, i
     return *cache;
 }
 
+/// What a worker reports that ended with none of the library's own failures. Made when the library
+/// is loaded, because the failure may be that there is no memory, and never destroyed, because a
+/// worker may still run when the process ends. 1359 is ERROR_INTERNAL_ERROR.
+Exception const& internalError = *new InternalErrorException(
+    TSLAUTH_PROVIDER_INTERNAL_ERROR, FindMappedException(TSLAUTH_PROVIDER_INTERNAL_ERROR).text);
+
 /// The work of a worker: asks, stores the answer in `cache`, clears `active` and reports the end.
 /// A failure leaves the cache as it was. One of the library's own family reaches the waiter as it
 /// is; any other would end the host's process if it left the thread, and becomes an internal error.
 /// Answers are swapped in, so that nothing can fail under the lock.
 template <typename Answer, typename Ask>
 void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, Answer& cache,
-                    Answer neutral, Ask ask) {
+                    Ask ask) {
     try {
-        Answer answer = AnswerOr(std::move(neutral), ask);
+        Answer answer = AnswerOr(Answer(), ask);
         {
             MutexLock const lock(mutex);
             std::swap(cache, answer);
@@ -127,7 +134,7 @@ void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, A
         state.Done(&failure);
     } catch (...) {
         Clear(mutex, active);
-        state.DoneWithInternalError();
+        state.Done(&internalError);
     }
 }
 
@@ -270,19 +277,19 @@ void ActiveDirectoryStore::GetStoreConfigurationInt(
     } catch (...) {
         // Not even an empty answer could be made.
         Clear(_lock, _isGetStoreConfigThreadActive);
-        state->DoneWithInternalError();
+        state->Done(&internalError);
     }
 }
 
 void ActiveDirectoryStore::GetTrustedDomainsInt(ProviderPointer provider, StatePointer state,
                                                 boost::shared_ptr<std::deque<Domain>> cache) {
-    AnswerInWorker(_lock, _isGetTrustedDomainsThreadActive, *state, *cache, std::deque<Domain>(),
+    AnswerInWorker(_lock, _isGetTrustedDomainsThreadActive, *state, *cache,
                    [&] { return provider->GetTrustedDomains(); });
 }
 
 void ActiveDirectoryStore::GetDomainTrustStateInt(ProviderPointer provider, StatePointer state,
                                                   boost::shared_ptr<TrustState> cache) {
-    AnswerInWorker(_lock, _isGetTrustStateThreadActive, *state, *cache, TrustState{0},
+    AnswerInWorker(_lock, _isGetTrustStateThreadActive, *state, *cache,
                    [&] { return TrustState{provider->GetDomainTrustState()}; });
 }
 

@@ -13,10 +13,10 @@ namespace tessel::authentication {
 
 namespace {
 
-/// Now + `seconds`, held within what the clock can count: time_t has 32 bits in a 32-bit process.
+/// Now + `seconds`, held within what the clock can count.
 timespec DeadlineIn(int seconds) {
     timeval now;
-    gettimeofday(&now, nullptr);
+    (void)gettimeofday(&now, nullptr); // cannot fail with a valid address
     timespec deadline;
     if (__builtin_add_overflow(now.tv_sec, seconds, &deadline.tv_sec)) {
         deadline.tv_sec = std::numeric_limits<time_t>::max();
@@ -31,8 +31,9 @@ timespec DeadlineIn(int seconds) {
 } // namespace
 
 RequestState::RequestState() : _done(false), _failureLost(false) {
-    pthread_mutex_init(&_mutex, nullptr);
-    pthread_cond_init(&_condition, nullptr);
+    // With default attributes neither can fail: both are memory that is filled in.
+    (void)pthread_mutex_init(&_mutex, nullptr);
+    (void)pthread_cond_init(&_condition, nullptr);
 }
 
 RequestState::~RequestState() {
@@ -50,13 +51,6 @@ void RequestState::Done(Exception const* failure) noexcept {
             _failureLost = true;
         }
     }
-    pthread_cond_signal(&_condition);
-}
-
-void RequestState::DoneWithInternalError() noexcept {
-    MutexLock const lock(_mutex);
-    _done = true;
-    _failureLost = true;
     pthread_cond_signal(&_condition);
 }
 

@@ -29,8 +29,8 @@ void TslauthThreadUtil::ScheduleThread(Call call) {
         copy.reset();
         ThrowThreadError("pthread_create failed. RC=", error);
     }
-    (void)copy.release(); // the thread's now
-    pthread_detach(thread);
+    (void)copy.release();         // the thread's now
+    (void)pthread_detach(thread); // cannot fail: the thread is ours, and joinable until now
 }
 
 } // namespace tessel::authentication

@@ -135,13 +135,6 @@ TEST(RequestState, FailureThatCannotBeKeptIsNotTakenForSuccess) {
     }
 }
 
-TEST(RequestState, EndWithSomethingElseThanAnExceptionIsAnInternalError) {
-    RequestState state;
-    state.DoneWithInternalError();
-    EXPECT_THROW(state.WaitResult(0), InternalErrorException);
-    EXPECT_EQ(InternalError, MessageOf(state, 60));
-}
-
 TEST(RequestState, WaiterThatGivesUpLeavesTheWorkerItsState) {
     auto state = boost::make_shared<RequestState>();
     boost::weak_ptr<RequestState> const observed = state;

@@ -28,10 +28,6 @@ public:
     /// be made, the waiter is told of an internal error.
     void Done(Exception const* failure) noexcept;
 
-    /// Called instead of `Done` where the work ended with something that is no `Exception`, such as
-    /// `std::bad_alloc` or what a provider throws. Needs no memory.
-    void DoneWithInternalError() noexcept;
-
     /// Waits until the work has ended. May be called again, and after `Done`; it then answers at
     /// once and in the same way.
     /// @param timeoutSeconds how long to wait at most, on the system's wall clock; 0 or less does
@@ -41,16 +37,15 @@ public:
     /// @throws ThreadErrorException where the wait itself fails. Its message is "Thread Error: " +
     ///     "pthread_cond_timedwait failed. RC=" without as many leading characters as the error
     ///     number (pthread_cond_timedwait(3)) says; support tools know the texts.
-    /// @throws InternalErrorException where the worker's failure was none of the library's own, or
-    ///     could not be kept
+    /// @throws InternalErrorException where the worker's failure could not be kept
     void WaitResult(int timeoutSeconds);
 
 private:
     bool _done;
-    bool _failureLost;
     std::unique_ptr<Exception> _failure;
     pthread_mutex_t _mutex;
     pthread_cond_t _condition;
+    bool _failureLost; // for lack of memory
 };
 
 } // namespace authentication
