@@ -20,6 +20,7 @@ void AddConfigurationCases(Table& table, Places const& places);
 void AddActiveDirectoryProviderCases(Table& table);
 void AddActiveDirectoryStoreCases(Table& table, Places const& places);
 void AddActiveDirectoryStoreQuestionsCases(Table& table);
+void AddCertificateThumbprintCases(Table& table);
 void AddTslauthctlCases(Table& table);
 
 } // namespace bench

@@ -35,6 +35,7 @@ int main(int count, char** values) {
     AddActiveDirectoryProviderCases(table);
     AddActiveDirectoryStoreCases(table, places);
     AddActiveDirectoryStoreQuestionsCases(table);
+    AddCertificateThumbprintCases(table);
     AddTslauthctlCases(table);
     if (observe) {
         table.Observe();

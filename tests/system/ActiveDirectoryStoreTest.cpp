@@ -78,7 +78,8 @@ TEST_F(ActiveDirectoryStoreTest, ProviderThatIsNotChosenIsUnset) {
     for (char const* text : {"provider = \"\"\n", "provider =\n", "other = \"plain\"\n", ""}) {
         Host::Write(Paths::ProviderConfiguration, text);
         EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException) << text;
-        EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider '(unset)' is invalid",
+        EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory "
+                  "provider '(unset)' is invalid",
                   ConstructionFailure())
             << text;
     }
@@ -87,27 +88,31 @@ TEST_F(ActiveDirectoryStoreTest, ProviderThatIsNotChosenIsUnset) {
 TEST_F(ActiveDirectoryStoreTest, MissingProviderConfigurationMeansNoneInstalled) {
     ASSERT_EQ(0, unlink(Paths::ProviderConfiguration));
     EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException);
-    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider '(none installed)' is invalid",
+    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider "
+              "'(none installed)' is invalid",
               ConstructionFailure());
 }
 
 TEST_F(ActiveDirectoryStoreTest, MalformedProviderConfigurationIsAConfigurationError) {
     Host::Write(Paths::ProviderConfiguration, "provider = \"\nplain");
     EXPECT_THROW(ActiveDirectoryStore(60), ConfigurationError);
-    EXPECT_EQ("ConfigurationError: Error parsing configuration at line 1: invalid quoting", ConstructionFailure());
+    EXPECT_EQ("ConfigurationError: Error parsing configuration at line 1: invalid quoting",
+              ConstructionFailure());
 }
 
 TEST_F(ActiveDirectoryStoreTest, ProviderThatDoesNotLoadPassesItsOwnExceptionThrough) {
     Host::Write(Paths::ProviderConfiguration, "provider = absent\n");
     EXPECT_THROW(ActiveDirectoryStore(60), IOError);
-    EXPECT_EQ("IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared "
-              "object file" +
-                  NoFile,
-              ConstructionFailure());
+    EXPECT_EQ(
+        "IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared "
+        "object file" +
+            NoFile,
+        ConstructionFailure());
 
     Host::Write(Paths::ProviderConfiguration, "provider = too-new\n");
     EXPECT_THROW(ActiveDirectoryStore(60), InvalidActiveDirectoryProviderException);
-    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider 'too-new' is invalid: The API version (3) "
+    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider "
+              "'too-new' is invalid: The API version (3) "
               "is not supported by this version of libtslauth",
               ConstructionFailure());
 }
@@ -291,7 +296,8 @@ TEST_F(ActiveDirectoryStoreTest, MissingPolicyIsAnIOErrorAndNothingIsCreated) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     auto const before = Host::Snapshot();
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("IOError: Cannot open '/etc/pam.d/system-auth-generic'" + NoFile, ActivationFailure());
+    EXPECT_EQ("IOError: Cannot open '/etc/pam.d/system-auth-generic'" + NoFile,
+              ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
 }
 
@@ -310,9 +316,11 @@ TEST_F(ActiveDirectoryStoreTest, PolicyThatTheModelRefusesStaysAsItIs) {
         char const* message;
     } const cases[] = {
         {"@include common-auth\n", "InvalidFacilityException: Invalid Facility: @include"},
-        {"-session optional pam_systemd.so\n", "InvalidFacilityException: Invalid Facility: -session"},
+        {"-session optional pam_systemd.so\n",
+         "InvalidFacilityException: Invalid Facility: -session"},
         {"auth Required pam_unix.so\n", "InvalidControlException: Invalid Control: Required"},
-        {"auth required pam_unix.so \\\n  nullok\n", "InvalidFacilityException: Invalid Facility: nullok"},
+        {"auth required pam_unix.so \\\n  nullok\n",
+         "InvalidFacilityException: Invalid Facility: nullok"},
         {"auth", "InvalidControlException: Invalid Control: "},
         {"\x7f"
          "ELF\x01",
@@ -414,11 +422,12 @@ TEST_F(ActiveDirectoryStoreTest, UnreadableFileIsNamedAndNothingChanges) {
         char const* path;
         char const* message;
     } const cases[] = {
-        {Paths::PAMPolicy, "IOError: Cannot open '/etc/pam.d/system-auth-generic': Permission denied"},
+        {Paths::PAMPolicy,
+         "IOError: Cannot open '/etc/pam.d/system-auth-generic': Permission denied"},
         {Paths::AuthenticationConfiguration,
          "IOError: Unable to open '/etc/tessel/tslauth/authentication.conf': Permission denied"},
-        {Paths::ProviderConfiguration,
-         "InvalidActiveDirectoryProviderException: The specified Active Directory provider '(none installed)' is invalid"},
+        {Paths::ProviderConfiguration, "InvalidActiveDirectoryProviderException: The specified "
+                                       "Active Directory provider '(none installed)' is invalid"},
     };
     auto const before = Host::Snapshot();
     for (auto const& unreadable : cases) {
@@ -492,11 +501,13 @@ TEST_F(ActiveDirectoryStoreTest, BadRecordStopsTheActivationBeforeItBegins) {
         std::string text;
         char const* message;
     } const cases[] = {
-        {"", "InvalidKeyException: The specified key 'remote-authentication-store' was not found in this configuration"},
+        {"", "InvalidKeyException: The specified key 'remote-authentication-store' was not found "
+             "in this configuration"},
         {Binary, "ConfigurationError: Error parsing configuration on line 1: no delimiter found"},
         {ManyAssignments() + "x\n",
          "ConfigurationError: Error parsing configuration on line 100001: no delimiter found"},
-        {LongAssignment() + "x = '", "ConfigurationError: Error parsing configuration at line 2: invalid quoting"},
+        {LongAssignment() + "x = '",
+         "ConfigurationError: Error parsing configuration at line 2: invalid quoting"},
     };
     for (auto const& bad : cases) {
         Host::Write(Paths::AuthenticationConfiguration, bad.text);
@@ -520,13 +531,15 @@ TEST_F(ActiveDirectoryStoreTest, BadProviderConfigurationIsReportedWithItsText) 
         char const* message;
     } const cases[] = {
         {Binary, "ConfigurationError: Error parsing configuration on line 1: no delimiter found"},
-        {"provider = \"plain\"\r\n",
-         "IOError: Unable to open provider: /usr/libexec/tslauth/lib\"plain\"\r.so: cannot open shared "
-         "object file: No such file or directory"},
+        {"provider = \"plain\"\r\n", "IOError: Unable to open provider: "
+                                     "/usr/libexec/tslauth/lib\"plain\"\r.so: cannot open shared "
+                                     "object file: No such file or directory"},
         {ManyAssignments() + "provider =\n",
-         "InvalidActiveDirectoryProviderException: The specified Active Directory provider '(unset)' is invalid"},
+         "InvalidActiveDirectoryProviderException: The specified Active Directory provider "
+         "'(unset)' is invalid"},
         {LongAssignment() + ManyAssignments() + "provider = absent",
-         "IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared object "
+         "IOError: Unable to open provider: /usr/libexec/tslauth/libabsent.so: cannot open shared "
+         "object "
          "file: No such file or directory"},
     };
     for (auto const& bad : cases) {
@@ -540,7 +553,8 @@ TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     ASSERT_EQ(0, mkdir(Paths::PAMPolicy, 0755));
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': Is a directory", ActivationFailure());
+    EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': Is a directory",
+              ActivationFailure());
     ASSERT_EQ(0, rmdir(Paths::PAMPolicy));
 }
 

@@ -166,13 +166,15 @@ TEST_F(NoRemoteAuthenticationStoreTest, UnknownStoreIsReportedOnceAndNoneStaysRe
     EXPECT_NO_THROW(_none.MakeActive());
 
     Record("Example Store");
-    EXPECT_EQ("UnknownRemoteAuthenticationStoreException: The specified store 'Example Store' is unknown",
-              Host::FailureOf([&] { _none.MakeActive(); }));
+    EXPECT_EQ(
+        "UnknownRemoteAuthenticationStoreException: The specified store 'Example Store' is unknown",
+        Host::FailureOf([&] { _none.MakeActive(); }));
 }
 
 TEST_F(NoRemoteAuthenticationStoreTest, EmptyNameIsUnknown) {
     Record("");
-    EXPECT_EQ("UnknownRemoteAuthenticationStoreException: The specified store '' is unknown", Host::FailureOf([&] { _none.MakeActive(); }));
+    EXPECT_EQ("UnknownRemoteAuthenticationStoreException: The specified store '' is unknown",
+              Host::FailureOf([&] { _none.MakeActive(); }));
     EXPECT_EQ(None, Recorded());
 }
 
@@ -211,7 +213,8 @@ TEST_F(NoRemoteAuthenticationStoreTest, MissingConfigurationIsAnIOError) {
 
 TEST_F(NoRemoteAuthenticationStoreTest, MissingKeyChangesNothing) {
     Host::Write(Paths::AuthenticationConfiguration, "a = \"b\"\n");
-    EXPECT_EQ("InvalidKeyException: The specified key 'remote-authentication-store' was not found in this configuration",
+    EXPECT_EQ("InvalidKeyException: The specified key 'remote-authentication-store' was not found "
+              "in this configuration",
               Host::FailureOf([&] { _none.MakeActive(); }));
     EXPECT_EQ("a = \"b\"\n", Recorded());
 }
@@ -229,7 +232,8 @@ TEST_F(NoRemoteAuthenticationStoreTest, FileThatCannotBeWrittenStaysAsItWas) {
 
 TEST_F(NoRemoteAuthenticationStoreTest, CannotBeWithdrawn) {
     EXPECT_THROW(_none.MakeInactive(), std::runtime_error);
-    EXPECT_EQ("runtime_error: Attempted to disable None Store", Host::FailureOf([&] { _none.MakeInactive(); }));
+    EXPECT_EQ("runtime_error: Attempted to disable None Store",
+              Host::FailureOf([&] { _none.MakeInactive(); }));
     try {
         _none.MakeInactive();
     } catch (Exception const&) {

@@ -34,7 +34,8 @@ TEST_F(RemoteAuthenticationStoreTest, MissingFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::AuthenticationConfiguration));
     NoRemoteAuthenticationStore const none;
     EXPECT_THROW(none.IsActive(), IOError);
-    EXPECT_EQ("IOError: Unable to open '/etc/tessel/tslauth/authentication.conf': No such file or directory",
+    EXPECT_EQ("IOError: Unable to open '/etc/tessel/tslauth/authentication.conf': No such file or "
+              "directory",
               Host::FailureOf([&] { none.IsActive(); }));
 }
 
@@ -50,6 +51,7 @@ TEST_F(RemoteAuthenticationStoreTest, MissingKeyIsNotAnsweredWithFalse) {
     Host::Write(Paths::AuthenticationConfiguration, "other = \"None\"\n");
     NoRemoteAuthenticationStore const none;
     EXPECT_THROW(none.IsActive(), InvalidKeyException);
-    EXPECT_EQ("InvalidKeyException: The specified key 'remote-authentication-store' was not found in this configuration",
+    EXPECT_EQ("InvalidKeyException: The specified key 'remote-authentication-store' was not found "
+              "in this configuration",
               Host::FailureOf([&] { none.IsActive(); }));
 }
