@@ -72,6 +72,7 @@ ExitCode RunJoin(JoinArguments const& arguments, Limit limit, Output& output) {
                  *password);
     Join(Account::given, "the join to " + domain, output,
          [store, target = arguments.domain, user, password, skipsCheck] {
+             LastUse const lastUse(*password);
              store->JoinDomain(target, {user.c_str(), password->Text()}, skipsCheck);
          });
     document["joined"] = true;

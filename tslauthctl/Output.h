@@ -49,7 +49,7 @@ private:
 
 enum class Colour { automatic, always, never };
 
-/// The only place that writes to the terminal. Text for people is gathered and written at the end,
+/// The only place that writes to the terminal, but for the question for a password. Text for people is gathered and written at the end,
 /// in one go; with JSON it is one document instead. What comes from files is to be given as it is:
 /// control characters are escaped here.
 class Output {

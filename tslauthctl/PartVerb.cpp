@@ -18,6 +18,7 @@ std::function<void()> PartCall(AccountArguments const& arguments, Limit limit) {
     auto const password = std::make_shared<Secret>();
     ReadPassword(arguments.password, "Password of '" + *arguments.user + "': ", *password);
     return [store, user = *arguments.user, password] {
+        LastUse const lastUse(*password);
         store->PartDomain({user.c_str(), password->Text()});
     };
 }

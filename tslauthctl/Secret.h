@@ -40,6 +40,20 @@ private:
     char* _memory;
 };
 
+/// Wipes a secret at the end of its last use, whoever else still holds it.
+class LastUse {
+public:
+    explicit LastUse(Secret& secret) : _secret(secret) {}
+    LastUse(LastUse const&) = delete;
+    LastUse& operator=(LastUse const&) = delete;
+    ~LastUse() {
+        _secret.Wipe();
+    }
+
+private:
+    Secret& _secret;
+};
+
 } // namespace tessel::tslauthctl
 
 #endif

@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-/// One function a command, each in the file of its name. They report through `output`, say how the
+/// One function a command, each in the file of its name or in that of its kind. They report through `output`, say how the
 /// process ends, and throw `Failure` or the library's exceptions where they could not do their
 /// work.
 namespace tessel::tslauthctl {

@@ -3,6 +3,7 @@
 """Joining, asking and parting with tslauthctl: through the example providers as a user does, and
 through one that fails and hangs as it is told."""
 
+import fcntl
 import os
 import pathlib
 import re
@@ -279,6 +280,24 @@ class Failures(Case):
         (SCRIPTS / "new").rename(SCRIPTS / "dc")
         self.assertEqual(b"dc1.corp.example\n", process.communicate(timeout=30)[0])
         self.assertEqual(DONE, process.returncode)
+
+    def test_the_longest_limit(self):
+        script(dc="dc1")
+        self.assertEqual("dc1", ask("dc", "a", "--timeout", str(2 ** 31 - 1))["controller"])
+
+    def test_what_changes_the_host_waits_for_the_lock(self):
+        script()
+        ask("part")  # makes the lock's file
+        for arguments in (("part",), ("preferred-dcs", "clear"), ("cam", "import", SERVER, "/none"),
+                          ("join", "--cam", SERVER), ("join", "a", "--user", "b",
+                                                      "--password-stdin")):
+            with open(LOCK, "r+b") as lock:
+                fcntl.flock(lock, fcntl.LOCK_EX)
+                process = subprocess.Popen([TOOL, *arguments], stdin=subprocess.DEVNULL,
+                                           stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
+                with self.assertRaises(subprocess.TimeoutExpired, msg=arguments):
+                    process.wait(timeout=0.3)
+            process.wait(timeout=30)
 
     def test_a_failed_question_is_told_with_its_class(self):
         script(domain="code 5", controllers="dc1", trusted="code 2", trust="4")
