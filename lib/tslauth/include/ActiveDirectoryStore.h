@@ -129,7 +129,7 @@ public:
     /// @throws InvalidHostNameException where the host's name is too long (more than 63 bytes),
     ///     does not resolve, resolves to another short name, or is one of "localhost", "linux" and
     ///     "hostname"
-    /// @throws HostCtl::Lib::HostCtlException where the hosts file, the DNS configuration or the
+    /// @throws HostCtl::Lib::HostCtlException (<strandctl/HostCtlException.h>) where the hosts file, the DNS configuration or the
     ///     management interface cannot be read or changed
     /// @throws the provider's failure
     void JoinDomain(std::string const& domain, Credentials const& credentials,

@@ -2,6 +2,7 @@
 #ifndef TSLAUTH_STRING_CAST_H
 #define TSLAUTH_STRING_CAST_H
 
+#include <locale>
 #include <sstream>
 #include <string>
 

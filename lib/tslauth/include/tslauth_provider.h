@@ -26,6 +26,8 @@
  * entry must not let a C++ exception escape.
  *
  * Text is bytes, ended by a zero byte; no encoding is assumed or converted.
+ *
+ * The file is C99, and C++11 or later.
  */
 
 #include <stddef.h>
@@ -142,7 +144,9 @@ typedef struct ActiveDirectoryClientMetadataRecord {
      * TSLAUTH_PROVIDER_API_VERSION: refused. */
     int32_t apiVersion;
 
-    /* File name of the PAM module, such as "pam_example.so". Never null. */
+    /* File name of the PAM module, such as "pam_example.so". Never null. The library writes it as
+     * "sufficient /lib/security/$ISA/" + this + parameters, into "auth" and "account" alone; libpam
+     * passes over a module that it cannot load. */
     char const* pamModule;
 
     /* Its parameters, separated by white space; there is no quoting. May be null: none. */

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // What a caller of the installed library does: makes stores by name, reads and prints a policy, and
 // catches the library's exceptions as their own classes and as their base.
+#include <strandctl/HostCtlException.h>
 #include <tslauth/tslauth.h>
 
 #include <iostream>
@@ -45,6 +46,14 @@ int main() {
         caught = error.Code() == 0;
     }
     Expect(caught, "an exception arrives as its base");
+
+    caught = false;
+    try {
+        throw HostCtl::Lib::HostCtlException("what a join passes on");
+    } catch (HostCtl::Lib::HostCtlException const&) {
+        caught = true;
+    }
+    Expect(caught, "host control's exception can be caught by who links this library alone");
 
     std::istringstream input("auth required /lib/security/$ISA/pam_unix.so\n");
     SystemConfiguration::PAMPolicy policy("system-auth-generic");
