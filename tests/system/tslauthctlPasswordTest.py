@@ -478,4 +478,7 @@ class Secrecy(Case):
 
 
 if __name__ == "__main__":
+    # A job in a script's background has these two ignored, and so would the tool.
+    signal.signal(signal.SIGQUIT, signal.SIG_DFL)
+    signal.signal(signal.SIGINT, signal.default_int_handler)
     main()
