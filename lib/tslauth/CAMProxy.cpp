@@ -40,11 +40,11 @@ void Check(int code) {
 
 CAMProxy::CAMProxy(std::string const& providerName, std::string const& serverAddress,
                    bool verifyCertificate, std::string const& thumbprint)
-    : _operations(nullptr), _verifyCertificate(verifyCertificate), _server(serverAddress),
-      _thumbprint(thumbprint) {
     // Global, because CAM providers load parts of their own that look for their symbols.
-    _library = LoadProvider(providerName, RTLD_LAZY | RTLD_GLOBAL, "Unable to open CAM provider: ");
-    _operations = FindRecord<CAMProxyClientOperationsRecord>(_library, "CAMProxyClientOperations");
+    : _library(
+          LoadProvider(providerName, RTLD_LAZY | RTLD_GLOBAL, "Unable to open CAM provider: ")),
+      _operations(FindRecord<CAMProxyClientOperationsRecord>(_library, "CAMProxyClientOperations")),
+      _verifyCertificate(verifyCertificate), _server(serverAddress), _thumbprint(thumbprint) {
     if (_operations == nullptr) {
         throw InvalidCAMProxyProviderException(providerName, LoaderError());
     }

@@ -5,16 +5,20 @@
 
 namespace tessel::authentication {
 
-void LibraryCloser::operator()(void* library) const noexcept {
+namespace {
+
+void Close(void* library) {
     // The result is ignored: nobody could do anything about a library that stays.
     (void)dlclose(library);
 }
+
+} // namespace
 
 LibraryHandle LoadProvider(std::string const& name, int flags, char const* failure) {
     std::string const path = Paths::ProviderPrefix + name + Paths::ProviderSuffix;
     // An error that somebody else has left behind must not pass for this library's.
     (void)dlerror();
-    LibraryHandle library(dlopen(path.c_str(), flags));
+    LibraryHandle library(dlopen(path.c_str(), flags), &Close);
     if (library == nullptr) {
         throw IOError(failure + LoaderError());
     }

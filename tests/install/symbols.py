@@ -43,6 +43,13 @@ def declared(include):
     return "\n".join(text)
 
 
+def qualified(symbol):
+    """The name with its namespaces: without what it is a table of, and without the return type,
+    which comes with the instances of function templates."""
+    name = PREFIXES.sub("", symbol.split("@@")[0])
+    return re.sub(r"^[\w:]+<\S+> (?=[\w:]+<)", "", name)
+
+
 def without_templates(name):
     while "<" in re.sub(r"operator<<?=?", "", name):
         shorter = re.sub(r"(?<!operator)(?<!operator<)<[^<>]*>", "", name)
@@ -54,8 +61,7 @@ def without_templates(name):
 
 def parts(symbol):
     """The enclosing class, if any, and the member's or function's own name."""
-    name = PREFIXES.sub("", symbol.split("@@")[0])
-    name = re.sub(r"\[abi:cxx11\]", "", name)
+    name = re.sub(r"\[abi:cxx11\]", "", qualified(symbol))
     conversion = re.search(r"::operator (?![^(]*\()", name) or re.search(r"::operator [a-z]", name)
     if conversion:
         return name[: conversion.start()].split("::")[-1], "operator"
@@ -77,7 +83,7 @@ def main():
 
     headers = declared(include)
     for symbol in symbols:
-        if not PREFIXES.sub("", symbol).startswith(OURS):
+        if not qualified(symbol).startswith(OURS):
             differences.append(f"in a foreign namespace: {symbol}")
             continue
         scope, name = parts(symbol)

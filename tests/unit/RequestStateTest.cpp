@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "../TimedWait.h"
+
 #include <tslauth/Exceptions.h>
 #include <tslauth/RequestState.h>
 #include <tslauth/TslauthThreadUtil.h>
