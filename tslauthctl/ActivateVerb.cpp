@@ -108,6 +108,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Output& output) 
             output.Warning(file.path + ": " + loss + ", as accepted");
         }
     }
+    output.Warnings(plan.warnings);
     output.Line("'" + store + "' is active; " +
                 (changed.empty() ? "nothing had to be changed"
                                  : Counted(changed.size(), "file") + " changed") +

@@ -10,6 +10,8 @@
 #include <SystemFile.h>
 
 #include <algorithm>
+#include <glob.h>
+#include <unistd.h>
 
 namespace tessel::tslauthctl {
 
@@ -55,6 +57,39 @@ ProviderEntries LoadProvider() {
     using namespace ProviderModules;
     return {PAMEntryFor(provider.PAMModule(), provider.PAMModuleParameters()),
             NSSServiceFor(provider.NSSModule(), provider.NSSModuleParameters())};
+}
+
+std::vector<std::string> MissingModules(ProviderEntries const& entries) {
+    std::vector<std::string> missing;
+    auto const isMissing = [](std::string const& path) { return access(path.c_str(), F_OK) != 0; };
+
+    auto const& module = entries.pam.module();
+    std::vector<std::string> candidates = {module};
+    std::string const isa = "$ISA";
+    if (auto const at = module.find(isa); at != std::string::npos) {
+        for (auto const* const directory : Paths::PAMModuleDirectories) {
+            candidates.push_back(std::string(module).replace(at, isa.size(), directory));
+        }
+    }
+    if (std::all_of(candidates.begin(), candidates.end(), isMissing)) {
+        missing.push_back("the PAM module '" + module +
+                          "' is not installed; libpam passes over its entries, and no user of the "
+                          "provider can log in");
+    }
+
+    std::string const name = "libnss_" + entries.nss.module() + ".so.2";
+    bool found = false;
+    for (auto const* const directory : Paths::LibraryDirectories) {
+        glob_t matches = {};
+        found = found || glob((directory + name).c_str(), GLOB_NOSORT, nullptr, &matches) == 0;
+        globfree(&matches);
+    }
+    if (!found) {
+        missing.push_back("the name-service module '" + name +
+                          "' is not installed; the C library passes over the service, and no user "
+                          "of the provider is known");
+    }
+    return missing;
 }
 
 std::optional<std::string> ReadPolicy(std::string const& name) {

@@ -9,6 +9,7 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 /// What is read from the host; nothing is written here.
 namespace tessel::tslauthctl {
@@ -33,6 +34,10 @@ std::string ConfiguredProvider();
 /// Loads the configured provider, through the same checks as the store, and asks what it brings.
 /// @throws what the store's constructor throws
 ProviderEntries LoadProvider();
+
+/// One sentence for each of the provider's two modules that is in none of the places where libpam and
+/// the C library look for it. Both pass over such a module without a word to who logs in.
+std::vector<std::string> MissingModules(ProviderEntries const& entries);
 
 /// The text of a policy by the name that an include gives; nothing where it cannot be read.
 std::optional<std::string> ReadPolicy(std::string const& name);

@@ -116,6 +116,13 @@ void Output::Warning(std::string_view text) {
     Coloured(red, Escaped(text));
 }
 
+void Output::Warnings(std::vector<std::string> const& texts) {
+    for (auto const& text : texts) {
+        Warning("warning: " + text);
+        _document["warnings"].push_back(text);
+    }
+}
+
 void Output::Note(std::string_view text) {
     Coloured(dim, Escaped(text));
 }
@@ -140,7 +147,8 @@ void Output::Diff(std::string_view text) {
 }
 
 void Output::Waiting(std::string_view text) {
-    if (isatty(STDERR_FILENO) == 1) {
+    // Also where it is no terminal: who reads a log wants to know what a command hangs on.
+    if (!_json) {
         // Nothing depends on it.
         (void)WriteAll(STDERR_FILENO, "tslauthctl: " + Escaped(text) + "\n");
     }
@@ -148,7 +156,7 @@ void Output::Waiting(std::string_view text) {
 
 void Output::Progress(std::string_view text) {
     if (!CanOverwrite()) {
-        if (!std::exchange(_progress, true)) {
+        if (isatty(STDERR_FILENO) == 1 && !std::exchange(_progress, true)) {
             Waiting(text);
         }
         return;

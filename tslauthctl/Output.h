@@ -61,13 +61,15 @@ public:
     /// One line that must not be overlooked, and one that may be.
     void Warning(std::string_view text);
     void Note(std::string_view text);
+    /// What keeps the host from working as it was told to; with JSON the field "warnings".
+    void Warnings(std::vector<std::string> const& texts);
     /// A unified diff.
     void Diff(std::string_view text);
 
-    /// At once, and only if somebody sits there: why nothing happens.
+    /// At once, to the error stream, if people read it: why nothing happens.
     void Waiting(std::string_view text);
 
-    /// As `Waiting`, but the next one takes its place, and `EndProgress` leaves nothing of it.
+    /// As `Waiting`, but only if somebody sits there; the next one takes its place, and `EndProgress` leaves nothing of it.
     void Progress(std::string_view text);
     void EndProgress();
 

@@ -51,6 +51,7 @@ void PlanSystemFiles(Edit edit, ProviderEntries const& entries, Plan& plan) {
 
 void PlanActiveDirectory(Plan& plan) {
     auto const entries = LoadProvider();
+    plan.warnings = MissingModules(entries);
     plan.recorded = RecordedStore();
     PlanSystemFiles(Edit::insert, entries, plan);
     plan.files.push_back(PlanRecord(Paths::AuthenticationConfiguration,

@@ -40,6 +40,8 @@ struct Plan {
     std::string recorded;
     /// In the order in which the library writes them; unchanged ones, too.
     std::vector<PlannedFile> files;
+    /// What keeps the store from working although nothing would be lost.
+    std::vector<std::string> warnings;
     std::optional<Refusal> refusal;
     /// The refusal comes after the files above have been written, and there is no way around it.
     bool refusedAfterwards = false;

@@ -40,6 +40,7 @@ void DescribePlan(Plan const& plan, Output& output) {
             output.Note(file.path + ": " + note);
         }
     }
+    output.Warnings(plan.warnings);
     document["refusal"] = nullptr;
     if (plan.refusal) {
         document["refusal"] = {{"message", plan.refusal->message},

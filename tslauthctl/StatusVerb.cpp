@@ -85,6 +85,7 @@ ExitCode RunStatus(Output& output) {
         provider["name"] = name;
     }
     std::optional<ProviderEntries> entries;
+    std::vector<std::string> warnings;
     std::string const shown = name.empty() ? "none" : name;
     try {
         entries = LoadProvider();
@@ -92,9 +93,12 @@ ExitCode RunStatus(Output& output) {
         provider["pam_module"] = entries->pam.module();
         provider["nss_module"] = entries->nss.module();
         output.Line("provider: " + shown);
+        warnings = MissingModules(*entries);
     } catch (std::exception const& e) {
         provider["error"] = {{"message", e.what()}, {"exception", ClassName(e)}};
-        output.Line("provider: " + shown + " (cannot be loaded: " + e.what() + ")");
+        output.Line("provider: " + shown +
+                    (name.empty() ? " (provider.conf names none, or is missing)"
+                                  : std::string(" (cannot be loaded: ") + e.what() + ")"));
         output.Line("Without the provider it cannot be told whether the files agree with the "
                     "store.");
     }
@@ -109,6 +113,9 @@ ExitCode RunStatus(Output& output) {
         [&](std::string const& text) { return NSSParts(text, entries->nss, wanted); },
         UnknownNSSParts(), output);
 
+    if (wanted) {
+        output.Warnings(warnings);
+    }
     auto const drifts = [](Agreement agreement) {
         return agreement == Agreement::partly || agreement == Agreement::notAtAll;
     };

@@ -10,9 +10,9 @@
 #include <string>
 #include <vector>
 
-/// One function a command, each in the file of its name or in that of its kind. They report through `output`, say how the
-/// process ends, and throw `Failure` or the library's exceptions where they could not do their
-/// work.
+/// One function a command, each in the file of its name or in that of its kind. They report through
+/// `output`, say how the process ends, and throw `Failure` or the library's exceptions where they
+/// could not do their work.
 namespace tessel::tslauthctl {
 
 struct Plan;

@@ -23,7 +23,7 @@ using namespace tessel::tslauthctl;
 
 constexpr char footer[] = R"(Exit codes:
   0  done
-  1  failed, for instance because the output or the lock cannot be written
+  1  failed: the output or the lock cannot be written, or status cannot read a file
   2  wrong usage, or a store that is not known
   3  must be run as root
   4  refused by the library; its message is shown
@@ -117,7 +117,10 @@ public:
             return {};
         } catch (CLI::ParseError const& e) {
             exitCode = static_cast<int>(ExitCode::usage);
-            error = std::string(e.what()) + " (see tslauthctl --help)";
+            auto const command = Command();
+            auto const unknown = command.empty() ? UnknownCommand(argc, argv) : std::string();
+            error = unknown.empty() ? e.what() : "Unknown command '" + unknown + "'";
+            error += " (see tslauthctl " + (command.empty() ? "" : command + " ") + "--help)";
             return {};
         }
         return _run;
@@ -134,6 +137,24 @@ public:
     }
 
 private:
+    /// The first argument that is no option, where no command has its name.
+    std::string UnknownCommand(int argc, char** argv) const {
+        for (int i = 1; i < argc; ++i) {
+            std::string const argument = argv[i];
+            if (argument == "--color") {
+                ++i; // its value
+            } else if (argument.empty() || argument.front() != '-') {
+                auto const commands = _app.get_subcommands(nullptr);
+                bool const known =
+                    std::any_of(commands.begin(), commands.end(), [&](CLI::App const* command) {
+                        return command->get_name() == argument;
+                    });
+                return known ? std::string() : argument;
+            }
+        }
+        return {};
+    }
+
     void AddMembership(Arguments& arguments) {
         auto* join =
             AddAsking(_app, "join", "Join the host to a domain", arguments, [&](Output& output) {
@@ -244,20 +265,28 @@ private:
 
     static void AddCommon(CLI::App& app, Arguments& arguments) {
         app.add_flag("--json", arguments.json, "Write one JSON document (schema version 1)");
-        app.add_option("--color", arguments.colour, "When to use colours: auto, always or never")
-            ->type_name("WHEN")
-            ->transform(
-                CLI::CheckedTransformer(std::map<std::string, Colour>{{"auto", Colour::automatic},
-                                                                      {"always", Colour::always},
-                                                                      {"never", Colour::never}},
-                                        CLI::ignore_case))
-            ->option_text("WHEN");
+        app.add_option_function<std::string>(
+               "--color",
+               [&arguments](std::string const& when) {
+                   std::map<std::string, Colour> const known = {{"auto", Colour::automatic},
+                                                                {"always", Colour::always},
+                                                                {"never", Colour::never}};
+                   auto const found = known.find(when);
+                   if (found == known.end()) {
+                       throw CLI::ValidationError("--color",
+                                                  "'" + when + "' is none of auto, always, never");
+                   }
+                   arguments.colour = found->second;
+               },
+               "When to use colours: auto, always or never")
+            ->type_name("WHEN");
     }
 
     CLI::App* Add(CLI::App& parent, char const* name, char const* description, Arguments& arguments,
                   std::function<ExitCode(Output&)> run) {
         auto* command = parent.add_subcommand(name, description);
         command->footer(footer);
+        command->set_version_flag("--version", "tslauthctl " TSLAUTH_VERSION);
         AddCommon(*command, arguments);
         command->callback([this, command, run = std::move(run)] {
             // A command's callback runs after that of a command below it, which is the one to run.
@@ -279,7 +308,7 @@ private:
         auto* command = Add(parent, name, description, arguments, std::move(run));
         command
             ->add_option(Limit::Name, arguments.limit.seconds,
-                         "Seconds that an answer is waited for (60)")
+                         "Seconds that each question is waited for (60)")
             ->check(CLI::Range(1, std::numeric_limits<int>::max()).description(""))
             ->type_name("SECONDS");
         return command;

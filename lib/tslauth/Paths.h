@@ -24,6 +24,12 @@ inline constexpr char ProviderSuffix[] = ".so";
 
 /// The module directory that the entries in the PAM policy name; libpam replaces "$ISA".
 inline constexpr char PAMModulePrefix[] = "/lib/security/$ISA/";
+/// What builds of libpam put in the place of "$ISA".
+inline constexpr char const* PAMModuleDirectories[] = {".", "/lib/security", "../../lib64/security",
+                                                       "../../lib/security"};
+/// Patterns of the folders that hold the C library's modules.
+inline constexpr char const* LibraryDirectories[] = {
+    "/lib/*-linux-gnu*/", "/usr/lib/*-linux-gnu*/", "/lib64/", "/usr/lib64/", "/lib/", "/usr/lib/"};
 /// The module of the access rules, in that directory: a provider's entry stands behind it.
 inline constexpr char PAMAccessModule[] = "pam_access.so";
 

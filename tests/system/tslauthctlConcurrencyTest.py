@@ -26,6 +26,9 @@ def whole_files():
     return wholes
 
 
+WAITING = b"tslauthctl: waiting for another tslauthctl to finish ...\n"
+
+
 class Concurrency(unittest.TestCase):
     def test_activations_never_interleave(self):
         set_up()
@@ -39,11 +42,12 @@ class Concurrency(unittest.TestCase):
                 self.assertEqual(DONE, document["exit"], document)
                 looks += 1
         for process in running:
-            self.assertEqual((DONE, b""), (process.returncode, process.communicate()[1]))
+            message = process.communicate()[1].replace(WAITING, b"")
+            self.assertEqual((DONE, b""), (process.returncode, message))
         self.assertGreater(looks, 0)
         self.assertEqual(DONE, ask("status")["exit"])
 
-    def test_without_the_lock_they_wait_and_say_so_on_a_terminal(self):
+    def test_without_the_lock_they_wait_and_say_so(self):
         set_up()
         run("activate", AD)
         with open(LOCK, "a") as lock:
@@ -58,6 +62,7 @@ class Concurrency(unittest.TestCase):
             time.sleep(0.2)
             self.assertIsNone(process.poll())
             self.assertIsNone(quiet.poll())
+            self.assertIn(b"waiting for another tslauthctl", os.read(quiet.stderr.fileno(), 4096))
             self.assertIn(AD, RECORD.read_text())
         self.assertEqual(DONE, process.wait(timeout=60))
         self.assertEqual(b"", quiet.communicate(timeout=60)[1])

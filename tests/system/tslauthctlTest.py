@@ -366,6 +366,26 @@ class Status(Case):
                          (document["exit"], document["error"]["exception"]))
 
 
+class Modules(Case):
+    """The modules of the example provider are installed; those of "gate" are not."""
+
+    def test_installed_ones_are_not_spoken_of(self):
+        for arguments in (("plan", AD), ("activate", AD), ("status",)):
+            self.assertNotIn("warnings", ask(*arguments))
+
+    def test_missing_ones_are_warned_of_and_stop_nothing(self):
+        set_up(provider="gate")
+        self.assertNotIn("warnings", ask("status"), "nobody wants them yet")
+        for arguments, code in ((("plan", AD), CHANGES), (("activate", AD), DONE),
+                                (("status",), DONE)):
+            document = ask(*arguments)
+            self.assertEqual(code, document["exit"])
+            pam, nss = document["warnings"]
+            self.assertIn("'/lib/security/$ISA/pam_gate.so' is not installed", pam)
+            self.assertIn("'libnss_gate.so.2' is not installed", nss)
+        self.assertNotIn("warnings", ask("activate", "None"))
+
+
 class Usage(Case):
     def test_it_is_told_what_is_wrong(self):
         for arguments in ((), ("plan",), ("plan", "a", "b"), ("nothing",), ("status", "--odd"),
@@ -382,8 +402,18 @@ class Usage(Case):
             self.assertEqual("Unknown store 'none'. Known are: 'Active Directory', 'None'",
                              self.unchanged(command, "none")["error"]["message"])
 
+    def test_the_message_names_what_is_wrong(self):
+        for arguments, message in (
+                (("nothing",), b"Unknown command 'nothing' (see tslauthctl --help)"),
+                (("--color", "never", "nothing"), b"Unknown command 'nothing'"),
+                (("stores", "--color=sometimes"), b"'sometimes' is none of auto, always, never"),
+                (("stores", "--color=1"), b"'1' is none of auto, always, never"),
+                (("activate",), b"(see tslauthctl activate --help)")):
+            self.assertIn(message, run(*arguments).stderr)
+
     def test_help_and_version_succeed(self):
-        self.assertRegex(run("--version").stdout, rb"^tslauthctl \d+\.\d+\.\d+\n$")
+        for command in ([], ["stores"], ["status"], ["plan"], ["activate"], ["prepare"], ["join"]):
+            self.assertRegex(run(*command, "--version").stdout, rb"^tslauthctl \d+\.\d+\.\d+\n$")
         for command in ([], ["stores"], ["status"], ["plan"], ["activate"], ["prepare"]):
             process = run(*command, "--help")
             self.assertEqual(DONE, process.returncode)
