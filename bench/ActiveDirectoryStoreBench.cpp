@@ -6,7 +6,9 @@
 #include <tslauth/ActiveDirectoryStore.h>
 
 #include <cerrno>
+#include <dlfcn.h>
 #include <filesystem>
+#include <stdexcept>
 #include <sys/mount.h>
 #include <system_error>
 
@@ -67,6 +69,31 @@ template <typename Activate> Body In(std::string const& folder, Activate activat
     };
 }
 
+constexpr int ManyStores = 10000;
+
+/// Stores that come and go; the row's peak memory is what they leave, if they leave any.
+template <typename Make> Body Coming(Make make) {
+    return [=](benchmark::State& state) {
+        Host::ConfigureProvider();
+        Measure(state, [&] {
+            for (int i = 0; i < ManyStores; ++i) {
+                make();
+            }
+        });
+    };
+}
+
+/// What a store cannot be made without: its provider's name, and the provider.
+void LoadByHand() {
+    Floor::Read(Host::Paths::ProviderConfiguration);
+    void* const library = ::dlopen("/usr/libexec/tslauth/libbench.so", RTLD_LAZY);
+    if (library == nullptr || ::dlsym(library, "ActiveDirectoryClientMetadata") == nullptr ||
+        ::dlsym(library, "ActiveDirectoryClientOperations") == nullptr) {
+        throw std::runtime_error("no provider");
+    }
+    ::dlclose(library);
+}
+
 } // namespace
 
 void AddActiveDirectoryStoreCases(Table& table, Places const& places) {
@@ -77,6 +104,8 @@ void AddActiveDirectoryStoreCases(Table& table, Places const& places) {
                   {{"ours", In(folder, [](Store& store) { store.MakeActive(); }), true},
                    {"floor", In(folder, [](Store&) { ActivateByHand(); }), true}});
     }
+    table.Add("10,000 stores made and destroyed", {Bar::Of::Ratio, 1.5}, Clock::Processor, 5,
+              {{"ours", Coming([] { Store const store(60); })}, {"floor", Coming(LoadByHand)}});
 }
 
 } // namespace bench
