@@ -1,37 +1,20 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/AtomicFileStream.h>
 
-#include "../TemporaryFolder.h"
-#include "../faults/Faults.h"
+#include "../faults/FaultTest.h"
 
 #include "SystemFile.h"
 
 #include <csignal>
 #include <gmock/gmock.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
 
 namespace tessel::authentication {
 namespace {
 
-/// Each test asks the same two questions: is the target whole, and does the caller know?
-class AtomicFileStreamFaultTest : public testing::Test {
+class AtomicFileStreamFaultTest : public FaultTest {
 protected:
-    void SetUp() override {
-        if (!faults::Available()) {
-            GTEST_SKIP() << "this kernel has no seccomp notifications";
-        }
-        Reset();
-    }
-
-    /// An old file with a mode of its own, and nothing beside it.
-    void Reset() {
-        for (std::string const& name : folder.Names()) {
-            std::filesystem::remove(folder / name);
-        }
-        SetContents(target, oldText);
-        ASSERT_EQ(0, ::chmod(target.c_str(), 0644));
-    }
+    AtomicFileStreamFaultTest() : FaultTest("file", "old contents\n") {}
 
     void ExpectOld() {
         EXPECT_TRUE(Contents(target) == oldText);
@@ -55,9 +38,6 @@ protected:
         return folder / folder.Names().back();
     }
 
-    TemporaryFolder folder;
-    std::string target = folder / "file";
-    std::string oldText = "old contents\n";
     std::string newText = "new contents, which are longer than the old ones\n";
     std::function<void()> replace = [this] { ReplaceFile(target, newText); };
     std::function<void()> replaceWithoutSync = [this] {

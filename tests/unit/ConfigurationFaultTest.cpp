@@ -1,49 +1,30 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/Configuration.h>
 
-#include "../TemporaryFolder.h"
-#include "../faults/Faults.h"
+#include "../faults/FaultTest.h"
 
 #include <algorithm>
 #include <csignal>
 #include <gmock/gmock.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
 
 namespace tessel::authentication {
 namespace {
 
-/// Each test asks the same two questions: is the file whole, and does the caller know?
-class ConfigurationFaultTest : public testing::Test {
+class ConfigurationFaultTest : public FaultTest {
 protected:
-    void SetUp() override {
-        if (!faults::Available()) {
-            GTEST_SKIP() << "this kernel has no seccomp notifications";
-        }
-        Reset();
-    }
-
-    void Reset() {
-        for (std::string const& name : folder.Names()) {
-            std::filesystem::remove(folder / name);
-        }
-        SetContents(path, oldText);
-        ASSERT_EQ(0, ::chmod(path.c_str(), 0644));
-    }
+    ConfigurationFaultTest() : FaultTest("test.conf", "c=3\nb=2\na=1\n") {}
 
     void ExpectUnwritten(faults::Outcome const& outcome, std::string const& reason) {
         EXPECT_EQ("tessel::authentication::IOError", outcome.exception);
-        EXPECT_EQ("Cannot write '" + path + "': " + reason, outcome.message);
-        EXPECT_EQ(oldText, Contents(path));
-        EXPECT_EQ(0644U, ModeOf(path));
+        EXPECT_EQ("Cannot write '" + target + "': " + reason, outcome.message);
+        EXPECT_EQ(oldText, Contents(target));
+        EXPECT_EQ(0644U, ModeOf(target));
     }
 
-    TemporaryFolder folder;
-    std::string path = folder / "test.conf";
-    std::string oldText = "c=3\nb=2\na=1\n";
     std::string newText = "a = \"1\"\nb = \"changed\"\nc = \"3\"\n";
     std::function<void()> write = [this] {
-        Configuration configuration(path);
+        Configuration configuration(target);
         configuration["b"] = "changed";
         configuration.Write();
     };
@@ -59,12 +40,12 @@ TEST_F(ConfigurationFaultTest, ReadingAndWritingMakesExactlyTheseCalls) {
                                      "write", "write", "write",               // a line each
                                      "fsync", "close", "stat", "chmod", "rename", "chmod", "open",
                                      "fsync", "close"));
-    EXPECT_EQ(newText, Contents(path));
+    EXPECT_EQ(newText, Contents(target));
 }
 
 TEST_F(ConfigurationFaultTest, ALineOfAnyLengthIsOneWrite) {
     faults::Outcome const outcome = faults::RunWithFaultAt(0, faults::Killed(), [&] {
-        Configuration configuration(path);
+        Configuration configuration(target);
         configuration.clear();
         for (std::size_t const size : {1U, 1000U, 1023U, 1024U, 8190U, 8191U, 8192U, 1000000U}) {
             configuration.emplace(std::to_string(size), std::string(size, 'v'));
@@ -72,7 +53,7 @@ TEST_F(ConfigurationFaultTest, ALineOfAnyLengthIsOneWrite) {
         configuration.Write();
     });
     EXPECT_EQ(8, std::count(outcome.calls.begin(), outcome.calls.end(), "write"));
-    EXPECT_EQ(8U, Configuration(path).size());
+    EXPECT_EQ(8U, Configuration(target).size());
 }
 
 TEST_F(ConfigurationFaultTest, WhicheverCallFailsTheFileIsWholeAndTheCallerKnows) {
@@ -84,9 +65,9 @@ TEST_F(ConfigurationFaultTest, WhicheverCallFailsTheFileIsWholeAndTheCallerKnows
                 EXPECT_TRUE(outcome.finished);
                 if (outcome.exception == "" ||
                     outcome.exception == "tessel::authentication::FilePermissionError") {
-                    EXPECT_EQ(newText, Contents(path));
+                    EXPECT_EQ(newText, Contents(target));
                 } else {
-                    EXPECT_EQ(oldText, Contents(path));
+                    EXPECT_EQ(oldText, Contents(target));
                     // A read error gives an empty configuration, whose keys are not found.
                     EXPECT_THAT(outcome.exception,
                                 testing::AnyOf("tessel::authentication::IOError",
@@ -104,32 +85,32 @@ TEST_F(ConfigurationFaultTest, WhereverTheProcessIsKilledTheFileIsWhole) {
             SCOPED_TRACE("call " + std::to_string(place) + ", " + outcome.calls[place - 1]);
             EXPECT_FALSE(outcome.finished);
             std::size_t const rename = 16;
-            EXPECT_EQ(place <= rename ? oldText : newText, Contents(path));
-            EXPECT_EQ(0644U, ModeOf(path));
+            EXPECT_EQ(place <= rename ? oldText : newText, Contents(target));
+            EXPECT_EQ(0644U, ModeOf(target));
         });
     EXPECT_EQ(20U, calls);
 }
 
 TEST_F(ConfigurationFaultTest, AnOpenThatFailsIsReportedWithItsReason) {
     faults::Outcome const outcome =
-        faults::RunWithFaultAt(1, faults::FailsWith(EMFILE), [&] { Configuration{path}; });
+        faults::RunWithFaultAt(1, faults::FailsWith(EMFILE), [&] { Configuration{target}; });
     EXPECT_EQ("tessel::authentication::IOError", outcome.exception);
-    EXPECT_EQ("Unable to open '" + path + "': Too many open files", outcome.message);
+    EXPECT_EQ("Unable to open '" + target + "': Too many open files", outcome.message);
 }
 
 TEST_F(ConfigurationFaultTest, AReadErrorEndsTheReadingQuietly) {
     faults::Outcome const outcome = faults::RunWithFaultIn("read", faults::FailsWith(EIO), [&] {
-        throw std::runtime_error(std::to_string(Configuration(path).size()));
+        throw std::runtime_error(std::to_string(Configuration(target).size()));
     });
     EXPECT_TRUE(outcome.injected);
     EXPECT_EQ("0", outcome.message);
-    EXPECT_EQ(oldText, Contents(path));
+    EXPECT_EQ(oldText, Contents(target));
 }
 
 TEST_F(ConfigurationFaultTest, WhatWasReadBeforeAReadErrorIsKept) {
     faults::Outcome const outcome = faults::RunWithFaultIn(
         "read", faults::FailsWith(EIO),
-        [&] { throw std::runtime_error(std::to_string(Configuration(path).size())); }, 2);
+        [&] { throw std::runtime_error(std::to_string(Configuration(target).size())); }, 2);
     EXPECT_TRUE(outcome.injected);
     EXPECT_EQ("3", outcome.message);
 }
@@ -137,7 +118,7 @@ TEST_F(ConfigurationFaultTest, WhatWasReadBeforeAReadErrorIsKept) {
 TEST_F(ConfigurationFaultTest, AnInterruptedReadIsRepeated) {
     faults::Outcome const outcome = faults::RunWithFaultIn(
         "read", faults::FailsWith(EINTR),
-        [&] { throw std::runtime_error(std::to_string(Configuration(path).size())); }, 1, 2);
+        [&] { throw std::runtime_error(std::to_string(Configuration(target).size())); }, 1, 2);
     EXPECT_TRUE(outcome.injected);
     EXPECT_EQ("3", outcome.message);
 }
