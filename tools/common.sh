@@ -25,7 +25,7 @@ become_root() {
 
 # What every program of this folder needs to build the library and to make a node.
 readonly build_packages=(
-    cmake ninja-build g++ pkg-config libboost-dev libssl-dev libcli11-dev nlohmann-json3-dev libdtl-dev
+    cmake ninja-build g++ pkg-config libboost-dev libssl-dev libcli11-dev nlohmann-json3-dev libdtl-dev libwbclient-dev
     libc6-dev iproute2 util-linux passwd
 )
 # What shows that the log-in is real: a PAM and a name-service module, and a client of each library.
