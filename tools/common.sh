@@ -60,13 +60,12 @@ install_packages() {
 
 # Every file that decides who may log in and how names are resolved, with mode, owner and sum.
 machine_configuration() {
+    local -a files=(/etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf
+        /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel /etc/samba /etc/krb5.conf
+        /etc/krb5.conf.d)
     {
-        find /etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf \
-            /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel \
-            -printf '%p %y %m %u %g %l\n' 2>/dev/null
-        find /etc/pam.d /etc/security /etc/nsswitch.conf /etc/hosts /etc/resolv.conf \
-            /etc/hostname /etc/passwd /etc/group /etc/shadow /etc/tessel \
-            -type f -exec sha256sum {} + 2>/dev/null
+        find "${files[@]}" -printf '%p %y %m %u %g %l\n' 2>/dev/null
+        find "${files[@]}" -type f -exec sha256sum {} + 2>/dev/null
         ls -d /lib/security /usr/libexec/tslauth /run/tslauthctl.lock 2>/dev/null
         echo "host name $(uname -n)"
     } | sort
