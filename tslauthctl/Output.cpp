@@ -193,6 +193,10 @@ void Output::Error(Failure const& failure) {
     if (!failure.ExceptionClass().empty()) {
         error["exception"] = failure.ExceptionClass();
     }
+    // A number that has no text here: only the provider knows what it met.
+    if (failure.ExceptionClass() == "tessel::authentication::UnknownException") {
+        ErrorDetail("the provider may have said more in the system log");
+    }
 }
 
 void Output::ErrorDetail(std::string_view text) {

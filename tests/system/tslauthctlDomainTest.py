@@ -235,6 +235,14 @@ class Failures(Case):
         # Nobody's credentials were refused.
         self.fails(REFUSED, "AccessDeniedException", "part")
 
+    def test_a_number_without_a_text_sends_the_reader_to_the_system_log(self):
+        advice = b"the provider may have said more in the system log"
+        for code, expected in ((4711, True), (1398, False)):
+            script(part=f"code {code}", domain="a domain")
+            process = run("part")
+            self.assertEqual(REFUSED, process.returncode)
+            self.assertEqual(expected, advice in process.stderr, process.stderr)
+
     def test_a_provider_that_hangs_costs_one_limit_and_is_never_an_empty_answer(self):
         hangs = {"domain": "hang", "trusted": "hang", "trust": "hang"}
         script(**hangs)
