@@ -1,5 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """What the scenarios share: nodes to run commands in, and steps with a name and a time."""
+import base64
+import concurrent.futures
 import contextlib
 import os
 import subprocess
@@ -11,6 +13,10 @@ STATE = os.environ.get("LAB_STATE") or os.path.join(TREE, "build/lab")
 BUILD = os.environ.get("LAB_BUILD") or os.path.join(TREE, "build/release")
 DOMAIN_LAB = os.path.join(TREE, "tools/domain-lab")
 PASSWORD = "Lab-Passw0rd"
+# Of the local users; no user of the domain has it.
+LOCAL_PASSWORD = "local secret"
+# A service that includes the policy which the library keeps.
+LOGIN_SERVICE = "lab-login"
 ENVIRONMENT = {
     "PATH": "/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
     "LC_ALL": "C",
@@ -85,17 +91,103 @@ class Node:
     def write(self, path, text, mode="0644"):
         self.shell('umask 077; cat >"$1"; chmod "$2" "$1"', path, mode, text=text)
 
+    def tslauthctl(self, *arguments, **options):
+        """A command of the tool that must succeed."""
+        return self.ok("tslauthctl", *arguments, **options)
+
+    def library(self, *arguments, **options):
+        """What a service that calls the library sees; its failures have exit code 1."""
+        return self.run(f"{STATE}/library-client", *arguments, **options)
+
+    def join(self, domain="corp.example", *options, user="joiner1", password=PASSWORD):
+        return self.tslauthctl("join", domain, "--user", user, "--password-stdin", *options,
+                               text=password + "\n")
+
+    def part(self, user="joiner1", password=PASSWORD):
+        return self.tslauthctl("part", "--user", user, "--password-stdin", text=password + "\n")
+
+    def make_local_users(self):
+        """The local user lena, a password for root, and a service to log in to."""
+        self.shell("""
+            hash=$(openssl passwd -6 "$1")
+            useradd --no-create-home --password "$hash" lena
+            usermod --password "$hash" root
+            printf '%s\\tinclude\\tsystem-auth-generic\\n' auth account session >"/etc/pam.d/$2"
+            """, LOCAL_PASSWORD, LOGIN_SERVICE)
+
+    def directory(self, query, *attributes):
+        """What a controller's own database holds: a list of name -> values, where the name "dn" has
+        one value."""
+        listing = self.ok("ldbsearch", "-H", "/var/lib/samba/private/sam.ldb", query, *attributes)
+        records = []
+        for block in listing.out.replace("\n ", "").split("\n\n"):
+            record = {}
+            for line in block.splitlines():
+                if line.startswith("#"):
+                    continue
+                name, _, value = line.partition(":")
+                if value.startswith(":"):
+                    value = base64.b64decode(value[1:]).decode(errors="replace")
+                record.setdefault(name, []).append(value.strip())
+            if "dn" in record:
+                record["dn"] = record["dn"][0]
+                records.append(record)
+        return records
+
+    def account_of(self, host, *attributes):
+        """The machine account of a host in a controller's own database, or None."""
+        found = self.directory(f"(sAMAccountName={host.name}$)", *attributes)
+        return found[0] if found else None
+
     def snapshot(self, *folders):
         """Every file below the folders: name -> (kind, mode, owner, group, target, sum)."""
-        listing = self.ok("find", *folders, "-printf", r"%p\t%y %m %U %G %l\n").out
+        listing = self.ok("find", *folders, "-xdev", "-printf", r"%p\t%y %m %U %G %l\n").out
         found = dict(line.split("\t", 1) for line in listing.splitlines())
         sums = self.shell(
-            'find "$@" -type f -print0 | xargs -0r sha256sum --zero | tr "\\0" "\\n"',
+            'find "$@" -xdev -type f -print0 | xargs -0r sha256sum --zero | tr "\\0" "\\n"',
             *folders).out
         for line in sums.splitlines():
             digest, path = line.split("  ", 1)
             found[path] += " " + digest
         return found
+
+
+class LogIn:
+    """A user who logs in through the policy. It starts at once and runs beside others, since
+    libpam takes its time before it says no."""
+
+    def __init__(self, host, user, password):
+        self._user = user
+        self._start = time.monotonic()
+        self._process = host.start(
+            "pamtester", LOGIN_SERVICE, user, "authenticate", "acct_mgmt",
+            stdin=subprocess.PIPE, stdout=subprocess.PIPE, stderr=subprocess.STDOUT)
+        self._process.stdin.write(password + "\n")
+        self._process.stdin.close()
+        self._process.stdin = None
+
+    def _answer(self):
+        return self._process.communicate(timeout=60)[0]
+
+    def is_let_in(self):
+        """How long that took, in seconds."""
+        answer = self._answer()
+        expect(self._process.returncode == 0 and
+               "pamtester: account management done.\n" in answer,
+               f"{self._user} was not let in\n{answer}")
+        return time.monotonic() - self._start
+
+    def is_refused(self, reason="pamtester: Authentication failure"):
+        answer = self._answer()
+        expect(self._process.returncode != 0 and "account management done" not in answer,
+               f"{self._user} was let in\n{answer}")
+        expect(reason in answer, f"'{reason}' is not why {self._user} was refused\n{answer}")
+
+
+def at_once(function, *lists):
+    """Calls the function for each item of the lists at the same time; a list of its results."""
+    with concurrent.futures.ThreadPoolExecutor(max_workers=len(lists[0])) as pool:
+        return list(pool.map(function, *lists))
 
 
 def differences(before, after):
