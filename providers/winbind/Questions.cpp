@@ -1,0 +1,323 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Questions.h"
+
+#include "BoundedCall.h"
+#include "Directory.h"
+#include "DirectoryNames.h"
+#include "DirectorySearch.h"
+#include "Failure.h"
+#include "WinbindClient.h"
+#include "tslauth_winbind_provider.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <memory>
+#include <netdb.h>
+#include <optional>
+#include <syslog.h>
+
+namespace tessel::winbind {
+
+namespace {
+
+using authentication::Domain;
+typedef BoundedCall::Clock Clock;
+
+/// How long winbindd may take to answer what it knows without a controller.
+constexpr std::chrono::seconds pingTime(3);
+
+Clock::time_point Deadline() {
+    return Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_QUESTION_SECONDS);
+}
+
+char Lower(char c) {
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+}
+
+std::string Lower(std::string text) {
+    std::transform(text.begin(), text.end(), text.begin(), [](char c) { return Lower(c); });
+    return text;
+}
+
+std::string Upper(std::string text) {
+    std::transform(text.begin(), text.end(), text.begin(), [](char c) {
+        return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
+    });
+    return text;
+}
+
+/// Whether `name` is one of the names of `domain`.
+bool Names(std::string const& name, Domain const& domain) {
+    std::string wanted = Lower(name);
+    if (!wanted.empty() && wanted.back() == '.') {
+        wanted.pop_back();
+    }
+    return !wanted.empty() &&
+           (wanted == Lower(domain.DNSName()) || wanted == Lower(domain.NetBIOSName()));
+}
+
+/// The host's domain; nothing where it has none.
+std::optional<Domain> Joined() {
+    Domain domain = GetActiveDomain();
+    if (domain == Domain()) {
+        return std::nullopt;
+    }
+    return domain;
+}
+
+Domain JoinedOrThrow() {
+    if (std::optional<Domain> const domain = Joined()) {
+        return *domain;
+    }
+    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "this host is joined to no domain");
+}
+
+/// The other domains that winbindd knows.
+std::vector<Domain> OtherDomains(WinbindClient const& client, Domain const& own) {
+    std::vector<Domain> others;
+    for (WinbindClient::Domain const& domain : client.ListDomains()) {
+        // This machine's own accounts, the built-in groups among them.
+        bool const isLocal = domain.trustType == WBC_DOMINFO_TRUSTTYPE_LOCAL;
+        if (!isLocal && !Names(domain.names.NetBIOSName(), own) &&
+            !Names(domain.names.DNSName(), own)) {
+            others.push_back(domain.names);
+        }
+    }
+    return others;
+}
+
+/// The domain that `name` means, the host's own or another that winbindd knows.
+std::optional<Domain> FindDomain(WinbindClient const& client, Domain const& own,
+                                 std::string const& name) {
+    if (Names(name, own)) {
+        return own;
+    }
+    for (Domain const& domain : OtherDomains(client, own)) {
+        if (Names(name, domain)) {
+            return domain;
+        }
+    }
+    return std::nullopt;
+}
+
+Domain FindDomainOrThrow(WinbindClient const& client, Domain const& own, std::string const& name) {
+    if (std::optional<Domain> const domain = FindDomain(client, own, name)) {
+        return *domain;
+    }
+    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
+                  "'" + name + "' is neither this host's domain nor one that it trusts");
+}
+
+/// The account name of the user that the canonical name `text` is of: its last part is the object's
+/// name, which may differ from the name that the user logs in with.
+std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& own,
+                                   Domain const& domain, std::string const& text,
+                                   std::string const& name, Clock::time_point deadline) {
+    std::string const controller =
+        Names(domain.DNSName(), own) ? "" : client.FindDomainController(domain.DNSName(), "");
+    for (DirectoryEntry const& entry : SearchDirectory(
+             controller,
+             "(&(objectCategory=person)(objectClass=user)(cn=" + EscapedForFilter(name) + "))",
+             {"canonicalName", "sAMAccountName"}, deadline)) {
+        if (Lower(ValueIn(entry, "canonicalName")) == Lower(text)) {
+            return ValueIn(entry, "sAMAccountName");
+        }
+    }
+    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER, "there is no user '" + text + "'");
+}
+
+/// This host's full name, as the join has registered it: what the resolver says of the machine's
+/// name, or that name in the domain where the resolver does not know it.
+std::string FullHostName(std::string const& machine, Domain const& own,
+                         Clock::time_point deadline) {
+    std::string const found =
+        BoundedCall::Run("the full name of this host", deadline, [machine]() -> std::string {
+            addrinfo hints = {};
+            hints.ai_flags = AI_CANONNAME | AI_ADDRCONFIG;
+            hints.ai_socktype = SOCK_STREAM;
+            addrinfo* list = nullptr;
+            if (getaddrinfo(machine.c_str(), nullptr, &hints, &list) != 0) {
+                return {};
+            }
+            std::unique_ptr<addrinfo, void (*)(addrinfo*)> const owner(list, &freeaddrinfo);
+            return list->ai_canonname == nullptr ? "" : list->ai_canonname;
+        });
+    return Lower(found.find('.') == std::string::npos ? machine + "." + own.DNSName() : found);
+}
+
+/// The numbers of a trusted domain object (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
+enum TrustDirection : unsigned long { Inbound = 0x1, Outbound = 0x2 };
+enum TrustAttributes : unsigned long {
+    NonTransitive = 0x1,
+    ForestTransitive = 0x8,
+    WithinForest = 0x20
+};
+
+/// The bits of a trust that the host's domain itself has.
+int DirectRelationship(DirectoryEntry const& trust) {
+    auto const number = [&](char const* attribute) {
+        // The directory writes 32 bits as a signed number.
+        return static_cast<unsigned long>(
+            std::strtol(ValueIn(trust, attribute).c_str(), nullptr, 10));
+    };
+    unsigned long const attributes = number("trustAttributes");
+    unsigned long const direction = number("trustDirection");
+    int bits = 0;
+    if ((attributes & WithinForest) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_IN_FOREST;
+    }
+    if ((attributes & (WithinForest | ForestTransitive)) != 0 &&
+        (attributes & NonTransitive) == 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_TRANSITIVE;
+    }
+    if ((direction & Inbound) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_INBOUND;
+    }
+    if ((direction & Outbound) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_OUTBOUND;
+    }
+    return bits;
+}
+
+} // namespace
+
+int TrustStateOf(ActiveDirectoryClientErrorCode code) {
+    switch (code) {
+    case TSLAUTH_PROVIDER_SUCCESS:
+        return TSLAUTH_WINBIND_TRUST_HEALTHY;
+    case TSLAUTH_PROVIDER_ACCESS_DENIED:
+    case TSLAUTH_PROVIDER_INVALID_PASSWORD:
+    case TSLAUTH_PROVIDER_NO_SUCH_USER:
+    case TSLAUTH_PROVIDER_LOGON_FAILURE:
+    case TSLAUTH_PROVIDER_PASSWORD_EXPIRED:
+    case TSLAUTH_PROVIDER_ACCOUNT_DISABLED:
+    case TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET:
+    case TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT:
+    case TSLAUTH_PROVIDER_DOMAIN_TRUST_INCONSISTENT:
+        return TSLAUTH_WINBIND_TRUST_SECRET_REFUSED;
+    case TSLAUTH_PROVIDER_NO_NETWORK:
+    case TSLAUTH_PROVIDER_CONNECTION_REFUSED:
+    case TSLAUTH_PROVIDER_CONNECTION_INVALID:
+    case TSLAUTH_PROVIDER_NO_LOGON_SERVERS:
+    case TSLAUTH_PROVIDER_NO_SUCH_DOMAIN:
+    case TSLAUTH_PROVIDER_TIMED_OUT:
+        return TSLAUTH_WINBIND_TRUST_NO_CONTROLLER;
+    case TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE:
+        return TSLAUTH_WINBIND_TRUST_NOT_RUNNING;
+    case TSLAUTH_PROVIDER_TIME_SKEW:
+        return TSLAUTH_WINBIND_TRUST_CLOCK;
+    default:
+        return TSLAUTH_WINBIND_TRUST_UNKNOWN;
+    }
+}
+
+int GetDomainTrustState() {
+    Clock::time_point const deadline = Deadline();
+    if (!Joined()) {
+        return TSLAUTH_WINBIND_TRUST_NOT_JOINED;
+    }
+    try {
+        WinbindClient(std::min(deadline, Clock::now() + pingTime)).Ping();
+    } catch (Failure const& failure) {
+        syslog(LOG_WARNING, "winbind: get domain trust state: %s", failure.what());
+        return failure.Code() == TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE
+                   ? TSLAUTH_WINBIND_TRUST_NOT_RUNNING
+                   : TSLAUTH_WINBIND_TRUST_NOT_ANSWERING;
+    }
+    try {
+        WinbindClient(deadline).CheckTrustCredentials();
+        return TSLAUTH_WINBIND_TRUST_HEALTHY;
+    } catch (Failure const& failure) {
+        syslog(LOG_WARNING, "winbind: get domain trust state: %s", failure.what());
+        return TrustStateOf(failure.Code());
+    }
+}
+
+std::vector<Domain> GetTrustedDomains() {
+    std::optional<Domain> const own = Joined();
+    return own ? OtherDomains(WinbindClient(Deadline()), *own) : std::vector<Domain>();
+}
+
+std::string GetAnyDomainController(std::string const& site, std::string const& domain) {
+    Clock::time_point const deadline = Deadline();
+    std::optional<Domain> const own = Joined();
+    if (!own) {
+        std::vector<std::string> const found = FindDomainControllers(domain);
+        if (found.empty()) {
+            throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
+                          "DNS lists no controller of '" + domain + "'");
+        }
+        return found.front();
+    }
+    WinbindClient const client(deadline);
+    std::optional<Domain> const known = FindDomain(client, *own, domain);
+    try {
+        // By its DNS name, where it has one: that is the name that sites and DNS know.
+        return client.FindDomainController(
+            known && !known->DNSName().empty() ? known->DNSName() : domain, site);
+    } catch (Failure const& failure) {
+        // winbindd has one answer for a domain that it cannot find and for one that is silent.
+        if (known && failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_DOMAIN) {
+            throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS, failure.what());
+        }
+        throw;
+    }
+}
+
+std::string ConvertCanonicalUsername(std::string const& name) {
+    Clock::time_point const deadline = Deadline();
+    UserName const user = ReadUserName(name);
+    Domain const own = JoinedOrThrow();
+    WinbindClient const client(deadline);
+    Domain const domain = FindDomainOrThrow(client, own, user.domain);
+    switch (user.form) {
+    case UserName::Form::canonical:
+        return client.GetUserName(
+            domain.NetBIOSName(),
+            AccountOfCanonicalName(client, own, domain, name, user.name, deadline));
+    case UserName::Form::downLevel:
+    case UserName::Form::principal:
+        break;
+    }
+    return client.GetUserName(domain.NetBIOSName(), user.name);
+}
+
+std::string GetHostPrincipalForDomain(std::string const& domain) {
+    Clock::time_point const deadline = Deadline();
+    Domain const own = JoinedOrThrow();
+    WinbindClient const client(deadline);
+    (void)FindDomainOrThrow(client, own, domain); // the principal is the same for all of them
+    return "host/" + FullHostName(Lower(client.GetHost().netBIOSName), own, deadline) + "@" +
+           Upper(own.DNSName());
+}
+
+int GetDomainTrustRelationship(std::string const& domain) {
+    Clock::time_point const deadline = Deadline();
+    std::optional<Domain> const own = Joined();
+    if (!own) {
+        return 0;
+    }
+    if (Names(domain, *own)) {
+        return TSLAUTH_WINBIND_TRUST_IN_FOREST | TSLAUTH_WINBIND_TRUST_TRANSITIVE |
+               TSLAUTH_WINBIND_TRUST_INBOUND | TSLAUTH_WINBIND_TRUST_OUTBOUND;
+    }
+    // winbindd, on a member, knows neither direction nor kind.
+    std::string const name = EscapedForFilter(domain);
+    std::vector<DirectoryEntry> const trusts = SearchDirectory(
+        "", "(&(objectClass=trustedDomain)(|(trustPartner=" + name + ")(flatName=" + name + ")))",
+        {"trustDirection", "trustAttributes"}, deadline);
+    if (!trusts.empty()) {
+        return DirectRelationship(trusts.front());
+    }
+    WinbindClient const client(deadline);
+    std::optional<Domain> const found = FindDomain(client, *own, domain);
+    if (!found) {
+        return 0;
+    }
+    // A domain behind another one, which the host reaches because all trusts between are transitive.
+    bool const isInForest = client.GetForest(own->DNSName()) == client.GetForest(found->DNSName());
+    return TSLAUTH_WINBIND_TRUST_TRANSITIVE | TSLAUTH_WINBIND_TRUST_OUTBOUND |
+           (isInForest ? TSLAUTH_WINBIND_TRUST_IN_FOREST | TSLAUTH_WINBIND_TRUST_INBOUND : 0);
+}
+
+} // namespace tessel::winbind
