@@ -56,6 +56,11 @@ ControllerAnswer ReadControllerAnswer(std::string_view text) {
 }
 
 std::optional<std::chrono::seconds> ReadServerTimeOffset(std::string_view text) {
+    // Where it gets no time, the tool prints the beginning of Unix time and an offset of 0.
+    if (text.find("Failed to get server's current time!") != std::string_view::npos ||
+        Behind(text, "Server time:").find(" 1970 ") != std::string_view::npos) {
+        return std::nullopt;
+    }
     auto number = Behind(text, "Server time offset:");
     bool const behind = StartsWith(number, "-");
     number.remove_prefix(behind ? 1 : 0);
