@@ -1,0 +1,662 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Node.h"
+#include "SystemLog.h"
+
+#include "../TemporaryFolder.h"
+
+#include <tslauth/CAMProxy.h>
+#include <tslauth/Exceptions.h>
+
+#include <chrono>
+#include <csignal>
+#include <dlfcn.h>
+#include <filesystem>
+#include <functional>
+#include <gmock/gmock.h>
+#include <memory>
+#include <regex>
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/wait.h>
+#include <thread>
+
+/// The CAM provider `winbind-cam` and its service, with real certificates and TLS between them. Samba's
+/// program is a stand-in: what a domain does with the blob is not looked at here.
+namespace tessel::authentication {
+namespace {
+
+using testing::AllOf;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::Not;
+namespace fs = std::filesystem;
+using std::chrono::steady_clock;
+
+std::string const Sources = TESTS_DATA_DIR "/../..";
+std::string const StandIn = "/run/stand-in";
+std::string const CodeFile = "/etc/tessel/tslauth/winbind-cam.code";
+std::string const AuthoritiesFile = "/etc/tessel/tslauth/winbind-cam-ca.pem";
+std::string const Server = "127.0.0.1";
+
+void WriteText(std::string const& path, std::string const& text, mode_t mode = 0644) {
+    std::ofstream(path, std::ios::binary) << text;
+    ASSERT_EQ(0, chmod(path.c_str(), mode)) << path;
+}
+
+/// What a shell command prints; it has to succeed.
+std::string Output(std::string const& command) {
+    std::string text;
+    FILE* const pipe = popen(command.c_str(), "re");
+    char buffer[4096];
+    while (std::size_t const size = fread(buffer, 1, sizeof buffer, pipe)) {
+        text.append(buffer, size);
+    }
+    EXPECT_EQ(0, pclose(pipe)) << command;
+    while (!text.empty() && text.back() == '\n') {
+        text.pop_back();
+    }
+    return text;
+}
+
+/// A program that runs until the object goes, with all that it prints in a file.
+class Program {
+public:
+    Program(std::vector<std::string> const& arguments, std::string log) : _log(std::move(log)) {
+        std::vector<char*> words;
+        for (std::string const& argument : arguments) {
+            words.push_back(const_cast<char*>(argument.c_str()));
+        }
+        words.push_back(nullptr);
+        (void)unlink(_log.c_str()); // an earlier one's
+        _process = fork();
+        if (_process == 0) {
+            int const file = open(_log.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
+            if (dup2(file, STDOUT_FILENO) >= 0 && dup2(file, STDERR_FILENO) >= 0) {
+                execv(words[0], words.data());
+            }
+            _exit(127);
+        }
+        auto const end = steady_clock::now() + std::chrono::seconds(30);
+        while (Log().find("serving") == std::string::npos) {
+            if (waitpid(_process, nullptr, WNOHANG) != 0 || steady_clock::now() > end) {
+                ADD_FAILURE() << arguments[0] << " does not serve: " << Log();
+                return;
+            }
+            std::this_thread::sleep_for(std::chrono::milliseconds(5));
+        }
+    }
+    Program(Program const&) = delete;
+    Program& operator=(Program const&) = delete;
+    ~Program() {
+        End(SIGKILL);
+    }
+
+    int End(int signal) {
+        int status = 0;
+        if (_process > 0) {
+            kill(_process, signal);
+            EXPECT_EQ(_process, waitpid(_process, &status, 0));
+            _process = 0;
+        }
+        return status;
+    }
+
+    std::string Log() const {
+        return fs::exists(_log) ? Contents(_log) : "";
+    }
+
+private:
+    std::string _log;
+    pid_t _process = 0;
+};
+
+/// How a call failed.
+struct Failed {
+    unsigned long code = 0;
+    std::string type;
+};
+
+Failed HowFailed(std::function<void()> const& call) {
+    try {
+        call();
+    } catch (Exception const& e) {
+        // The innermost name alone.
+        std::string const name = typeid(e).name();
+        std::smatch found;
+        std::regex_search(name, found, std::regex("[A-Z][A-Za-z]*Exception"));
+        return {e.Code(), found.str()};
+    }
+    return {};
+}
+
+MATCHER_P2(FailsWith, code, type, "") {
+    *result_listener << arg.type << " " << arg.code;
+    return arg.code == static_cast<unsigned long>(code) && arg.type == type;
+}
+
+auto const IsRefusedCertificate = FailsWith(0x80090325UL, "InvalidCAMCertificateException");
+auto const IsBroken = FailsWith(1229, "ConnectionInvalidException");
+
+auto IsUnknown(unsigned long code) {
+    return FailsWith(code, "UnknownException");
+}
+
+class WinbindCAMTest : public testing::Test {
+protected:
+    static void SetUpTestSuite() {
+        SystemLog::MakePrivateDevices();
+        _certificates = std::make_unique<TemporaryFolder>();
+        MakeAuthority("ca");
+        MakeAuthority("other");
+        MakeCertificate("good", "ca", "subjectAltName=IP:127.0.0.1");
+        MakeCertificate("second", "ca", "subjectAltName=IP:127.0.0.1");
+        MakeCertificate("unknown", "other", "subjectAltName=IP:127.0.0.1");
+        MakeCertificate("elsewhere", "ca", "subjectAltName=IP:127.0.0.2,DNS:127.0.0.1");
+        MakeCertificate("nowhere", "ca", "basicConstraints=CA:FALSE");
+        MakeCertificate("expired", "ca", "subjectAltName=IP:127.0.0.1", "-days -1");
+        MakeCertificate("client", "ca", "subjectAltName=IP:127.0.0.1\nextendedKeyUsage=clientAuth");
+    }
+
+    static void TearDownTestSuite() {
+        _certificates.reset();
+    }
+
+    void SetUp() override {
+        fs::remove_all(StandIn);
+        fs::remove_all(State());
+        fs::remove(CodeFile);
+        fs::remove(AuthoritiesFile);
+        fs::create_directories(StandIn);
+        fs::create_directories("/etc/tessel/tslauth");
+        WriteText(StandIn + "/accounts", "");
+        WriteText(_folder / "credentials", "username = joiner\npassword = secret\n", 0600);
+    }
+
+    // --- certificates ---
+
+    static std::string File(std::string const& name, std::string const& suffix) {
+        return *_certificates / (name + suffix);
+    }
+
+    static void MakeAuthority(std::string const& name) {
+        Output("openssl req -x509 -newkey rsa:2048 -nodes -days 2 -subj /CN=" + name + " -keyout " +
+               File(name, ".key") + " -out " + File(name, ".pem") + " 2>&1");
+    }
+
+    static void MakeCertificate(std::string const& name, std::string const& authority,
+                                std::string const& extensions,
+                                std::string const& validity = "-days 2") {
+        WriteText(File(name, ".ext"), extensions + "\n");
+        Output("cd " + _certificates->Path() +
+               " && openssl req -newkey rsa:2048 -nodes -subj /CN=127.0.0.1 -keyout " + name +
+               ".key -out " + name + ".csr 2>&1 && openssl x509 -req -in " + name + ".csr -CA " +
+               authority + ".pem -CAkey " + authority + ".key -CAcreateserial " + validity +
+               " -extfile " + name + ".ext -out " + name + ".pem 2>&1 && chmod 0600 " + name +
+               ".key");
+    }
+
+    static std::string ThumbprintOf(std::string const& name) {
+        std::string const text =
+            Output("openssl x509 -noout -fingerprint -sha1 -in " + File(name, ".pem"));
+        return text.substr(text.find('=') + 1);
+    }
+
+    static void TrustAuthority(std::string const& name) {
+        WriteText(AuthoritiesFile, Contents(File(name, ".pem")));
+    }
+
+    // --- the service ---
+
+    std::string State() const {
+        return _folder / "state";
+    }
+
+    std::unique_ptr<Program> Serve(std::string const& certificate = "good",
+                                   std::vector<std::string> const& more = {}) {
+        std::vector<std::string> arguments = {"/usr/bin/python3",
+                                              "-B",
+                                              Sources + "/cam-service/tslauth-cam-service",
+                                              "serve",
+                                              "--certificate",
+                                              File(certificate, ".pem"),
+                                              "--key",
+                                              File(certificate, ".key"),
+                                              "--credentials",
+                                              _folder / "credentials",
+                                              "--controller",
+                                              "dc1.corp.example",
+                                              "--state",
+                                              State(),
+                                              "--net-program",
+                                              Sources + "/tests/system/stand-in-net"};
+        arguments.insert(arguments.end(), more.begin(), more.end());
+        return std::make_unique<Program>(arguments, _folder / "log");
+    }
+
+    std::unique_ptr<Program> ServeFault(std::string const& fault,
+                                        std::string const& address = Server) {
+        return std::make_unique<Program>(
+            std::vector<std::string>{"/usr/bin/python3", "-B",
+                                     Sources + "/tests/system/faulty-cam-server", address,
+                                     File("good", ".pem"), File("good", ".key"), fault},
+            _folder / ("log-" + address));
+    }
+
+    std::string IssueCode(std::string const& arguments) const {
+        return Output("/usr/bin/python3 -B " + Sources +
+                      "/cam-service/tslauth-cam-service issue-code --state " + State() + " " +
+                      arguments);
+    }
+
+    void GiveCode(std::string const& arguments) {
+        WriteText(CodeFile, IssueCode(arguments) + "\n", 0600);
+    }
+
+    // --- the provider ---
+
+    static CAMProxy Pinned(std::string const& certificate = "good") {
+        return CAMProxy("winbind-cam", Server, false, ThumbprintOf(certificate));
+    }
+
+    static Failed AccountFailure(CAMProxy const& proxy, std::string const& host = "host01",
+                                 std::string const& unit = "") {
+        return HowFailed([&] { (void)proxy.CreateMachineAccount(host, unit); });
+    }
+
+    static Failed NameFailure(CAMProxy const& proxy) {
+        return HowFailed([&] { (void)proxy.GetDNSDomainName(); });
+    }
+
+    /// What a host gets, as the stand-in makes it.
+    static std::string BlobOf(std::string const& host) {
+        return Output("printf 'the blob of the account that was made for the host %-20s' " + host +
+                      " | base64 -w 0");
+    }
+
+    std::string Calls() const {
+        std::string const path = StandIn + "/calls";
+        return fs::exists(path) ? Contents(path) : "";
+    }
+
+    static std::unique_ptr<TemporaryFolder> _certificates;
+    TemporaryFolder _folder;
+};
+
+std::unique_ptr<TemporaryFolder> WinbindCAMTest::_certificates;
+
+TEST_F(WinbindCAMTest, TheServiceTellsItsDomain) {
+    auto const service = Serve();
+    CAMProxy const proxy = Pinned();
+    EXPECT_EQ("CORP", proxy.GetNetBIOSDomainName());
+    EXPECT_EQ("corp.example", proxy.GetDNSDomainName());
+    EXPECT_EQ("S-1-5-21-1-2-3", proxy.GetDomainSID());
+}
+
+TEST_F(WinbindCAMTest, ACodeGivesABlobAndIsGone) {
+    auto const service = Serve();
+    GiveCode("--host host01 --unit Servers/Linux");
+    std::string const code = Contents(CodeFile);
+    ComputerPrincipalInfo const account = Pinned().CreateMachineAccount("host01", "");
+    EXPECT_EQ(BlobOf("host01"), account.firstResult);
+    EXPECT_EQ("dc1.corp.example", account.secondResult);
+    EXPECT_FALSE(fs::exists(CodeFile));
+    EXPECT_THAT(Calls(),
+                AllOf(HasSubstr("machine_name=host01 "), HasSubstr("domain=corp.example "),
+                      HasSubstr("machine_account_ou=OU=Linux,OU=Servers,DC=corp,DC=example"),
+                      Not(HasSubstr("reuse")), Not(HasSubstr("secret"))));
+    EXPECT_THAT(service->Log(), AllOf(HasSubstr("127.0.0.1: made the account of host01"),
+                                      Not(HasSubstr(code.substr(0, 9))),
+                                      Not(HasSubstr(account.firstResult.substr(0, 20)))));
+}
+
+TEST_F(WinbindCAMTest, TheUnitThatTheCodeIsForMayBeNamed) {
+    auto const service = Serve();
+    GiveCode("--host host01 --unit Servers/Linux");
+    EXPECT_THAT(AccountFailure(Pinned(), "host01", "Servers"), IsUnknown(5));
+    EXPECT_TRUE(fs::exists(CodeFile)); // not taken
+    EXPECT_EQ(BlobOf("host01"),
+              Pinned().CreateMachineAccount("host01", "ou=Linux,ou=Servers").firstResult);
+}
+
+TEST_F(WinbindCAMTest, ACertificateThatIsNotThePinnedOneIsRefused) {
+    auto const service = Serve("second");
+    GiveCode("--host host01");
+    SystemLog log;
+    EXPECT_THAT(AccountFailure(Pinned("good")), IsRefusedCertificate);
+    EXPECT_THAT(log.Messages(),
+                testing::Contains(AllOf(HasSubstr("winbind-cam: create machine account: "),
+                                        HasSubstr(ThumbprintOf("good")),
+                                        HasSubstr(ThumbprintOf("second")))));
+    EXPECT_THAT(NameFailure(Pinned("good")), IsRefusedCertificate);
+    // Nothing was said to it.
+    EXPECT_THAT(service->Log(), Not(HasSubstr("host01")));
+    EXPECT_EQ(BlobOf("host01"), Pinned("second").CreateMachineAccount("host01", "").firstResult);
+}
+
+TEST_F(WinbindCAMTest, AThumbprintThatIsNoneMatchesNothing) {
+    auto const service = Serve();
+    for (std::string const& pin : {std::string("x"), std::string(59, 'A'),
+                                   ThumbprintOf("good") + ":00", ThumbprintOf("good").substr(3)}) {
+        EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", Server, false, pin)), IsRefusedCertificate);
+    }
+}
+
+TEST_F(WinbindCAMTest, WithNeitherPinNorVerificationOnlyNamesAreAsked) {
+    auto const service = Serve("unknown");
+    GiveCode("--host host01");
+    CAMProxy const proxy("winbind-cam", Server, false, "");
+    EXPECT_EQ("corp.example", proxy.GetDNSDomainName());
+    EXPECT_THAT(AccountFailure(proxy), IsRefusedCertificate);
+    EXPECT_THAT(service->Log(), Not(HasSubstr("host01")));
+    EXPECT_TRUE(fs::exists(CodeFile));
+}
+
+TEST_F(WinbindCAMTest, AVerifiedChainNeedsNoPin) {
+    auto const service = Serve();
+    GiveCode("--host host01");
+    TrustAuthority("ca");
+    EXPECT_EQ(
+        BlobOf("host01"),
+        CAMProxy("winbind-cam", Server, true, "").CreateMachineAccount("host01", "").firstResult);
+}
+
+TEST_F(WinbindCAMTest, TheSystemsAuthoritiesServeWhereThereAreNoOthers) {
+    auto const service = Serve();
+    CAMProxy const proxy("winbind-cam", Server, true, "");
+    EXPECT_THAT(NameFailure(proxy), IsRefusedCertificate);
+    std::string const link =
+        "/etc/ssl/certs/" + Output("openssl x509 -noout -hash -in " + File("ca", ".pem")) + ".0";
+    fs::copy_file(File("ca", ".pem"), link);
+    EXPECT_EQ("corp.example", proxy.GetDNSDomainName());
+    // One of one's own takes their place.
+    TrustAuthority("other");
+    EXPECT_THAT(NameFailure(proxy), IsRefusedCertificate);
+    fs::remove(link);
+}
+
+TEST_F(WinbindCAMTest, ACertificateThatCannotBeVerifiedIsRefused) {
+    TrustAuthority("ca");
+    GiveCode("--host host01");
+    for (char const* name : {"unknown", "elsewhere", "nowhere", "expired", "client"}) {
+        auto const service = Serve(name);
+        SystemLog log;
+        CAMProxy const proxy("winbind-cam", Server, true, "");
+        EXPECT_THAT(NameFailure(proxy), IsRefusedCertificate) << name;
+        EXPECT_THAT(AccountFailure(proxy), IsRefusedCertificate) << name;
+        // The right pin does not replace what was asked for as well.
+        CAMProxy const pinned("winbind-cam", Server, true, ThumbprintOf(name));
+        EXPECT_THAT(AccountFailure(pinned), IsRefusedCertificate) << name;
+        EXPECT_THAT(log.Messages(), testing::Contains(HasSubstr("the server's certificate: ")))
+            << name;
+        EXPECT_THAT(service->Log(), Not(HasSubstr("host01"))) << name;
+    }
+}
+
+TEST_F(WinbindCAMTest, AVerifiedChainDoesNotReplaceThePin) {
+    auto const service = Serve("second");
+    TrustAuthority("ca");
+    EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", Server, true, ThumbprintOf("good"))),
+                IsRefusedCertificate);
+    EXPECT_EQ("corp.example",
+              CAMProxy("winbind-cam", Server, true, ThumbprintOf("second")).GetDNSDomainName());
+}
+
+TEST_F(WinbindCAMTest, AuthoritiesThatCannotBeReadAreNotIgnored) {
+    auto const service = Serve();
+    WriteText(AuthoritiesFile, "no certificate\n");
+    EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", Server, true, "")), IsRefusedCertificate);
+}
+
+TEST_F(WinbindCAMTest, AServerThatIsNotThere) {
+    EXPECT_THAT(NameFailure(Pinned()), FailsWith(1225, "ConnectionRefusedException"));
+    // The node's network is a loopback interface.
+    EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", "192.0.2.1", false, "")), IsBroken);
+    EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", "dc1.corp.example", false, "")), IsBroken);
+}
+
+TEST_F(WinbindCAMTest, AServerThatEndsTooEarly) {
+    GiveCode("--host host01");
+    for (char const* fault : {"cut", "plain", "cut-hello", "cut-tls", "answer:{\"version\": 1",
+                              "answer:{\"version\": 1}\\n", "answer:"}) {
+        auto const server = ServeFault(fault);
+        EXPECT_THAT(NameFailure(Pinned()), IsBroken) << fault;
+        EXPECT_THAT(AccountFailure(Pinned()), IsBroken) << fault;
+    }
+    // It may have arrived or not: an administrator knows better.
+    EXPECT_TRUE(fs::exists(CodeFile));
+}
+
+TEST_F(WinbindCAMTest, AServerThatTalksNonsense) {
+    GiveCode("--host host01");
+    for (char const* fault : {"huge", "answer:\\n\\n", "answer:hello\\nworld\\n", "answer:{}\\n\\n",
+                              "answer:{\"version\": 1}\\n\\n\\n", "answer:{\"version\": 1}\\n\\nx",
+                              "answer:{\"version\": 1, \"controller\": \"a\\x00b\"}\\nQUJD\\n",
+                              "answer:{\"version\": 1, \"controller\": \"dc1\"}\\nno blob\\n"}) {
+        auto const server = ServeFault(fault);
+        EXPECT_THAT(NameFailure(Pinned()), IsUnknown(13)) << fault;
+        EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(13)) << fault;
+    }
+}
+
+TEST_F(WinbindCAMTest, AServerThatIsSilentIsWaitedForNoLongerThanTheLimit) {
+    struct {
+        char const* address;
+        char const* fault;
+    } const silent[] = {
+        {"127.0.0.11", "silent"}, {"127.0.0.12", "silent-tls"}, {"127.0.0.13", "drip"}};
+    std::vector<std::unique_ptr<Program>> servers;
+    std::vector<std::thread> threads;
+    for (auto const& one : silent) {
+        servers.push_back(ServeFault(one.fault, one.address));
+        threads.emplace_back([&one] {
+            auto const begin = steady_clock::now();
+            EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", one.address, false, "")),
+                        FailsWith(10060, "WSATimedOutException"))
+                << one.fault;
+            std::chrono::duration<double> const took = steady_clock::now() - begin;
+            EXPECT_GE(took.count(), 14.9) << one.fault;
+            EXPECT_LE(took.count(), 18) << one.fault;
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+}
+
+TEST_F(WinbindCAMTest, AHostWithoutACodeIsToldSo) {
+    auto const service = Serve();
+    SystemLog log;
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(2));
+    EXPECT_THAT(log.Messages(), testing::Contains(HasSubstr(CodeFile)));
+    WriteText(CodeFile, IssueCode("--host host01"), 0644);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(1338));
+    WriteText(CodeFile, "no code", 0600);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(87));
+    EXPECT_THAT(service->Log(), Not(HasSubstr("host01")));
+}
+
+TEST_F(WinbindCAMTest, ACodeThatIsNotThisHostsIsRefused) {
+    auto const service = Serve();
+    SystemLog log;
+    GiveCode("--host host02");
+    EXPECT_THAT(AccountFailure(Pinned(), "host01"), IsUnknown(5));
+    (void)IssueCode("--host host01");
+    EXPECT_THAT(AccountFailure(Pinned(), "host01"), IsUnknown(5));
+    EXPECT_THAT(service->Log(), AllOf(HasSubstr("host01: refused, no code is issued"),
+                                      HasSubstr("host01: refused, the code is wrong")));
+    EXPECT_THAT(Calls(), IsEmpty());
+    EXPECT_THAT(log.Messages(), testing::Contains(HasSubstr("refuses the one-time code")).Times(2));
+    // It is still the other one's.
+    EXPECT_EQ(BlobOf("host02"), Pinned().CreateMachineAccount("host02", "").firstResult);
+}
+
+TEST_F(WinbindCAMTest, ACodeServesOnce) {
+    auto const service = Serve();
+    GiveCode("--host host01");
+    std::string const code = Contents(CodeFile);
+    (void)Pinned().CreateMachineAccount("host01", "");
+    WriteText(CodeFile, code, 0600);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(5));
+}
+
+TEST_F(WinbindCAMTest, AnExpiredCodeIsRefused) {
+    auto const service = Serve();
+    GiveCode("--host host01 --valid-for 1");
+    std::string const file = State() + "/codes.json";
+    WriteText(file,
+              std::regex_replace(Contents(file), std::regex("\"expires\": [0-9]+"),
+                                 "\"expires\": " + std::to_string(time(nullptr))),
+              0600);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(5));
+    EXPECT_THAT(service->Log(), HasSubstr("the code has expired"));
+}
+
+TEST_F(WinbindCAMTest, WhoGuessesIsNotHeardAnyMore) {
+    auto const service = Serve();
+    std::string const right = IssueCode("--host host01");
+    WriteText(CodeFile, "AAAA-BBBB", 0600);
+    for (int i = 0; i < 5; ++i) {
+        EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(5)) << i;
+    }
+    WriteText(CodeFile, right, 0600);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(1909));
+    EXPECT_TRUE(fs::exists(CodeFile));
+}
+
+TEST_F(WinbindCAMTest, AnAccountThatExistsIsTakenOverOnRequestAlone) {
+    auto const service = Serve();
+    WriteText(StandIn + "/accounts", "host01\n");
+    GiveCode("--host host01");
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(1316));
+    EXPECT_FALSE(fs::exists(CodeFile));
+    EXPECT_THAT(Calls(), IsEmpty());
+    GiveCode("--host host01 --reuse");
+    EXPECT_EQ(BlobOf("host01"), Pinned().CreateMachineAccount("host01", "").firstResult);
+    EXPECT_THAT(Calls(), HasSubstr(" reuse "));
+}
+
+TEST_F(WinbindCAMTest, WhatTheDomainRefusesHasACode) {
+    auto const service = Serve("good", {"--default-unit", "Servers"});
+    struct {
+        char const* says;
+        unsigned long code;
+    } const refusals[] = {
+        {"failed to precreate account in ou OU=Servers,DC=corp,DC=example: No such object", 87},
+        {"User specified does not have administrator privileges", 1359},
+    };
+    for (auto const& refusal : refusals) {
+        WriteText(StandIn + "/says", refusal.says);
+        GiveCode("--host host01");
+        EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(refusal.code)) << refusal.says;
+        EXPECT_FALSE(fs::exists(CodeFile)) << refusal.says;
+    }
+    EXPECT_THAT(service->Log(), HasSubstr("does not have administrator privileges"));
+}
+
+TEST_F(WinbindCAMTest, ANameThatNoAccountCanHaveIsNotAskedFor) {
+    GiveCode("--host host01");
+    EXPECT_THAT(AccountFailure(Pinned(), "a234567890123456"), IsUnknown(1210));
+    EXPECT_THAT(AccountFailure(Pinned(), "host)(x"), IsUnknown(1210));
+}
+
+TEST_F(WinbindCAMTest, HostsThatAskAtOnceGetTheirOwn) {
+    auto const service = Serve();
+    constexpr int hosts = 8;
+    std::vector<pid_t> processes;
+    for (int i = 0; i < hosts; ++i) {
+        std::string const name = "host" + std::to_string(i);
+        std::string const code = IssueCode("--host " + name);
+        std::string const blob = BlobOf(name);
+        std::string const pin = ThumbprintOf("good");
+        pid_t const process = fork();
+        if (process == 0) {
+            // A host of its own, as far as the provider can tell. Nothing of the test's is run down.
+            bool isRight = unshare(CLONE_NEWNS) == 0 &&
+                           mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
+                           mount("host", "/etc/tessel/tslauth", "tmpfs", 0, "mode=0755") == 0;
+            WriteText(CodeFile, code, 0600);
+            try {
+                ComputerPrincipalInfo const account =
+                    CAMProxy("winbind-cam", Server, false, pin).CreateMachineAccount(name, "");
+                isRight = isRight && account.firstResult == blob && !fs::exists(CodeFile);
+            } catch (std::exception const& e) {
+                fprintf(stderr, "%s: %s\n", name.c_str(), e.what());
+                isRight = false;
+            }
+            _exit(isRight ? 0 : 1);
+        }
+        processes.push_back(process);
+    }
+    for (pid_t const process : processes) {
+        int status = -1;
+        EXPECT_EQ(process, waitpid(process, &status, 0));
+        EXPECT_EQ(0, status);
+    }
+    EXPECT_EQ("{}",
+              Output("tr -d ' \\n' < " + State() + "/codes.json | sed 's/.*\"codes\"://;s/.$//'"));
+}
+
+TEST_F(WinbindCAMTest, ThreadsOfAProcessMayAskAtOnce) {
+    auto const service = Serve();
+    CAMProxy const proxy = Pinned();
+    std::vector<std::thread> threads;
+    for (int i = 0; i < 6; ++i) {
+        threads.emplace_back([&proxy] {
+            for (int j = 0; j < 5; ++j) {
+                EXPECT_EQ("S-1-5-21-1-2-3", proxy.GetDomainSID());
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+}
+
+TEST_F(WinbindCAMTest, AServiceThatIsKilledInTheMiddleHasTakenTheCode) {
+    auto service = Serve();
+    GiveCode("--host host01");
+    WriteText(StandIn + "/hangs", "");
+    std::thread asking([] { EXPECT_THAT(AccountFailure(Pinned()), IsBroken); });
+    auto const end = steady_clock::now() + std::chrono::seconds(10);
+    while (Contents(State() + "/codes.json").find("HOST01") != std::string::npos &&
+           steady_clock::now() < end) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    service->End(SIGKILL);
+    asking.join();
+    fs::remove(StandIn + "/hangs");
+    service = Serve();
+    EXPECT_TRUE(fs::exists(CodeFile));
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(5));
+    // A new code is as good as ever.
+    GiveCode("--host host01 --reuse");
+    EXPECT_EQ(BlobOf("host01"), Pinned().CreateMachineAccount("host01", "").firstResult);
+}
+
+TEST_F(WinbindCAMTest, AServiceThatIsToldToEndAnswersFirst) {
+    auto service = Serve();
+    GiveCode("--host host01");
+    WriteText(StandIn + "/hangs", "");
+    std::thread asking([] {
+        EXPECT_EQ(BlobOf("host01"), Pinned().CreateMachineAccount("host01", "").firstResult);
+    });
+    auto const end = steady_clock::now() + std::chrono::seconds(10);
+    while (Contents(State() + "/codes.json").find("HOST01") != std::string::npos &&
+           steady_clock::now() < end) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    std::thread ending([&service] { EXPECT_EQ(0, service->End(SIGTERM)); });
+    std::this_thread::sleep_for(std::chrono::milliseconds(200));
+    fs::remove(StandIn + "/hangs");
+    asking.join();
+    ending.join();
+}
+
+TEST_F(WinbindCAMTest, NothingButTheRecordIsExported) {
+    EXPECT_EQ("CAMProxyClientOperations",
+              Output("nm -D --defined-only --format=posix /usr/libexec/tslauth/libwinbind-cam.so | "
+                     "cut -d ' ' -f 1"));
+}
+
+} // namespace
+} // namespace tessel::authentication
