@@ -1,11 +1,176 @@
 # SPDX-License-Identifier: Apache-2.0
-"""Hosts join, and users log in through what the library wrote."""
-from lab import PASSWORD
+"""Hosts join with credentials, and users log in through what the library wrote."""
+from lab import LOCAL_PASSWORD, LogIn, PASSWORD, at_once, expect, expect_equal
 
 TITLE = "Joining with credentials, and logging in"
 
+COMPUTERS = "CN=Computers,DC=corp,DC=example"
+LINUX = "OU=Linux,OU=Servers,DC=corp,DC=example"
+NETWORK_FILES = ("/etc/hosts", "/etc/resolv.conf")
+# What winbind may add to the log-in of a local user, in seconds. libpam itself takes some
+# milliseconds, and a question that waits for the network takes seconds.
+LOCAL_SLACK = 0.1
+
+# User, password, what is shown, and what the user is told where the answer is no.
+NO = "pamtester: Authentication failure"
+LOCAL_USERS = (
+    ("root", LOCAL_PASSWORD, "logs in", None),
+    ("root", PASSWORD, "is refused with a wrong password", NO),
+    ("lena", LOCAL_PASSWORD, "logs in", None),
+    ("lena", PASSWORD, "is refused with a wrong password", NO),
+)
+DOMAIN_USERS = (
+    ("CORP\\user1", PASSWORD, "logs in", None),
+    ("CORP\\user1", "Not-the-Passw0rd", "is refused with a wrong password", NO),
+    ("CORP\\user1", LOCAL_PASSWORD, "is refused with the password of root and lena", NO),
+    ("OTHER\\user2", PASSWORD, "of the trusted domain logs in", None),
+    ("OTHER\\user2", "Not-the-Passw0rd", "is refused with a wrong password", NO),
+    ("CORP\\disabled1", PASSWORD, "whose account is disabled is refused",
+     "Your account is disabled"),
+    ("CORP\\expired1", PASSWORD, "whose account has expired is refused",
+     "Your account has expired"),
+    ("CORP\\mustchange1", PASSWORD, "who must change the password first is refused",
+     "new one required"),
+    ("CORP\\nobody", PASSWORD, "whom nobody knows is refused", "pamtester: "),
+)
+STRANGERS = (
+    ("CORP\\user1", PASSWORD, "is refused", "pamtester: "),
+    ("OTHER\\user2", PASSWORD, "is refused", "pamtester: "),
+)
+
+
+def begin(host, users):
+    """All of them log in at the same time."""
+    return [(host, user, LogIn(host, user[0], user[1])) for user in users]
+
+
+def finish(lab, when, attempts):
+    for host, (name, _, text, told), attempt in attempts:
+        with lab.step(f"{when}, {host.name}: {name} {text}") as step:
+            step.took(attempt.is_let_in() if told is None else attempt.is_refused(told))
+
+
+def unknown(host, user):
+    """getent's code for a key that no service has."""
+    host.exits(2, "getent", "passwd", user)
+
+
+def fastest_log_in(host):
+    return min(LogIn(host, "lena", LOCAL_PASSWORD).is_let_in() for _ in range(5))
+
+
+def stands_in(lab, host, folder):
+    account = lab.dc1.account_of(host)
+    expect(account, f"the controller has no account {host.name}$")
+    expect_equal(account["dn"], f"CN={host.name.upper()},{folder}", "the account's place")
+
+
+def succeeded(result):
+    expect_equal((result.code, result.out), (0, ""), "what the library's call came to")
+
+
+def join_by_library(host, target, *options):
+    succeeded(host.library("join", target, "joiner1", *options, text=PASSWORD + "\n"))
+
+
+def joins(lab, path, short, long):
+    """Three hosts whose accounts go to a unit."""
+    before = {name: long.read(name) for name in NETWORK_FILES}
+    with lab.step(f"{path.name}: the library's JoinDomain, with the unit Servers/Linux"):
+        join_by_library(path, "corp.example/Servers/Linux")
+    with lab.step(f"{short.name}: the library's JoinDomain, with the unit OU=Linux,OU=Servers"):
+        join_by_library(short, "corp.example/OU=Linux,OU=Servers", "skip-hostname-check")
+    with lab.step(f"{long.name}: tslauthctl join --skip-hostname-check, with the unit's full DN"):
+        long.join(f"corp.example/{LINUX}", "--skip-hostname-check")
+    for host in (path, short, long):
+        with lab.step(f"{host.name}: on the controller its account stands in {LINUX}"):
+            stands_in(lab, host, LINUX)
+    with lab.step(f"{long.name}: {' and '.join(NETWORK_FILES)} are as they were"):
+        for name, text in before.items():
+            expect_equal(long.read(name), text, name)
+
+
+def plain_join(lab, host):
+    with lab.step(f"{host.name}: tslauthctl join corp.example"):
+        host.join()
+    with lab.step(f"{host.name}: on the controller its account stands in {COMPUTERS}"):
+        stands_in(lab, host, COMPUTERS)
+    with lab.step(f"{host.name}: its address has the name {host.name}.corp.example"):
+        address = host.ok("hostname", "-I").out.strip()
+        expect_equal(host.ok("getent", "hosts", address).out.split()[1:],
+                     [f"{host.name}.corp.example", host.name], f"the names of {address}")
+
+
+def is_activated(host):
+    policy = host.read("/etc/pam.d/system-auth-generic")
+    for facility in ("auth", "account"):
+        expect(f"{facility}\tsufficient\t/lib/security/$ISA/pam_winbind.so" in policy, policy)
+    switch = host.read("/etc/nsswitch.conf")
+    for database in ("passwd", "group", "shadow"):
+        expect(f"{database}: winbind files\n" in switch, switch)
+    host.tslauthctl("status")
+
+
+def resolves(controller, host, domain, user):
+    """A user of CORP has a number that is made of the last part of his identifier, so that all
+    hosts agree on it; one of another domain gets a number of this host."""
+    account = controller.directory(f"(sAMAccountName={user})", "objectSid")[0]
+    identifier = account["objectSid"][0]
+    name = f"{domain}\\{user}"
+    fields = host.ok("getent", "passwd", name).out.strip().split(":")
+    expect_equal(fields[0], name, "the name")
+    number = int(fields[2])
+    if domain == "CORP":
+        expect_equal(number, 2000000 + int(identifier.rsplit("-", 1)[1]), "the number")
+    else:
+        expect(1000000 <= number < 2000000, f"{name} has the number {number}")
+    expect_equal(host.ok("id", "-un", str(number)).out.strip(), name, "the number's name")
+    expect_equal(host.ok("wbinfo", "--uid-to-sid", str(number)).out.strip(), identifier,
+                 "the number's identifier, here and on the controller")
+
 
 def play(lab):
-    host = lab.host()
-    with lab.step("join"):
-        host.ok("tslauthctl", "join", "corp.example", "--user", "joiner1", "--password-stdin", text=PASSWORD + "\n")
+    plain, path, short, long = lab.hosts(4)
+    at_once(lambda host: host.make_local_users(), (plain, path))
+    baseline = fastest_log_in(plain)
+    attempts = begin(plain, LOCAL_USERS + STRANGERS)
+    with lab.step(f"not joined, {plain.name}: getent passwd knows no CORP\\user1"):
+        unknown(plain, "CORP\\user1")
+    joins(lab, path, short, long)
+    finish(lab, "not joined", attempts)
+
+    plain_join(lab, plain)
+    for host in (plain, path, short, long):
+        with lab.step(f"{host.name}: the controller takes its secret (net ads testjoin)"):
+            host.ok("net", "ads", "testjoin")
+
+    attempts = begin(plain, LOCAL_USERS + STRANGERS)
+    with lab.step(f"not active, {plain.name}: getent passwd knows no CORP\\user1"):
+        unknown(plain, "CORP\\user1")
+    with lab.step(f"{path.name}: the library's MakeActive"):
+        succeeded(path.library("activate"))
+        is_activated(path)
+    more_attempts = begin(path, LOCAL_USERS + DOMAIN_USERS[:2])
+    finish(lab, "not active", attempts)
+    with lab.step(f'{plain.name}: tslauthctl activate "Active Directory"'):
+        plain.tslauthctl("activate", "Active Directory")
+        is_activated(plain)
+
+    attempts = begin(plain, LOCAL_USERS + DOMAIN_USERS)
+    for host in (plain, path):
+        with lab.step(f"{host.name}: getent passwd 'CORP\\user1' and the controller agree"):
+            resolves(lab.dc1, host, "CORP", "user1")
+    with lab.step(f"{plain.name}: getent passwd 'OTHER\\user2' and its controller agree"):
+        resolves(lab.dc2, plain, "OTHER", "user2")
+    with lab.step(f"{plain.name}: id says that CORP\\user1 is in the group CORP\\domain users"):
+        groups = plain.ok("id", "-Gn", "CORP\\user1").out.lower()
+        expect("corp\\domain users" in groups, groups)
+    with lab.step(f"{plain.name}: getent passwd knows no user1, and no CORP\\nobody"):
+        unknown(plain, "user1")
+        unknown(plain, "CORP\\nobody")
+    finish(lab, "active", attempts + more_attempts)
+    with lab.step(f"active, {plain.name}: lena logs in as fast as before the join") as step:
+        seconds = fastest_log_in(plain)
+        step.took(seconds)
+        step.note(f"{1000 * baseline:.0f} ms before")
+        expect(seconds < baseline + LOCAL_SLACK, f"{seconds:.3f} s, before {baseline:.3f} s")
