@@ -40,6 +40,8 @@ constexpr KnownText KnownTexts[] = {
     {"password must be changed", TSLAUTH_PROVIDER_PASSWORD_EXPIRED},
     {"password_expired", TSLAUTH_PROVIDER_PASSWORD_EXPIRED},
     {"password has expired", TSLAUTH_PROVIDER_PASSWORD_EXPIRED},
+    // Kerberos looks for the service that changes passwords only then.
+    {"failed: cannot determine realm for host", TSLAUTH_PROVIDER_PASSWORD_EXPIRED},
 
     // What it may do.
     {"insufficient access", TSLAUTH_PROVIDER_ACCESS_DENIED},
@@ -73,14 +75,14 @@ constexpr KnownText KnownTexts[] = {
     {"specified computer name is invalid", TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME},
     {"netbios name can be at most", TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME},
     {"invalid_computer", TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME},
-    {"(\"netbios name\" set to", TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME},
+    {"\"netbios name\" set to", TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME},
     {"specified domain name is invalid", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
     {"invalid_domainname", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
     {"realm must be set", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
     {"supply a valid domain name", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
-    {"(\"realm\" set to", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
+    {"\"realm\" set to", TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME},
     {"specified workgroup name is invalid", TSLAUTH_PROVIDER_INVALID_WORKGROUP_NAME},
-    {"(\"workgroup\" set to", TSLAUTH_PROVIDER_INVALID_WORKGROUP_NAME},
+    {"\"workgroup\" set to", TSLAUTH_PROVIDER_INVALID_WORKGROUP_NAME},
     {"invalid_account_name", TSLAUTH_PROVIDER_INVALID_ACCOUNT_NAME},
     {"not a properly formed account name", TSLAUTH_PROVIDER_INVALID_ACCOUNT_NAME},
 
@@ -115,6 +117,7 @@ constexpr KnownText KnownTexts[] = {
 
     // An offline join: no blob at all, and one that this host cannot use.
     {"failed to read loadfile", TSLAUTH_PROVIDER_FILE_NOT_FOUND},
+    {"netrequestofflinedomainjoin: dos code 0x00000a95", TSLAUTH_PROVIDER_INVALID_PARAMETER},
     {"netrequestofflinedomainjoin: dos code 0x00000a96", TSLAUTH_PROVIDER_INVALID_PARAMETER},
     {"netrequestofflinedomainjoin: cannot complete", TSLAUTH_PROVIDER_INVALID_PARAMETER},
     {"netrequestofflinedomainjoin: the parameter is incorrect", TSLAUTH_PROVIDER_INVALID_PARAMETER},
@@ -160,6 +163,7 @@ constexpr KnownText KnownTexts[] = {
     {"find the ldap server", TSLAUTH_PROVIDER_NO_LOGON_SERVERS},
     {"find the cldap server", TSLAUTH_PROVIDER_NO_LOGON_SERVERS},
     {"cldap query failed", TSLAUTH_PROVIDER_NO_LOGON_SERVERS},
+    {"failed to find dc", TSLAUTH_PROVIDER_NO_LOGON_SERVERS},
 
     // The machine that this runs on, and what says least.
     {"no_memory", TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY},
