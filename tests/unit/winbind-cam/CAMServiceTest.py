@@ -180,10 +180,16 @@ class FakeDomain:
     netbios, dns, sid, controller = "CORP", DOMAIN, "S-1-5-21-1-2-3", "dc1.corp.example"
 
     def __init__(self):
+        self.accounts = []
         self.made = []
-        self.error = None
+        self.search_error = self.error = None
 
-    def make_account(self, host, unit, reuse):
+    def has_account(self, host, end):
+        if self.search_error:
+            raise self.search_error
+        return host in self.accounts
+
+    def make_account(self, host, unit, reuse, end):
         if self.error:
             raise self.error
         self.made.append((host, unit, reuse))
@@ -241,9 +247,8 @@ class Requests(Folder):
         self.assertEqual("QkxPQg==", self.account(code, unit="Servers")[1])
         self.assertEqual("OU=Servers,DC=corp,DC=example", self.domain.made[0][1])
 
-    def test_a_code_is_spent_whatever_becomes_of_the_account(self):
-        for error, answer in ((service.AccountExists(), "account-exists"),
-                              (service.NoSuchUnit(), "no-such-unit"),
+    def test_a_code_is_spent_once_the_account_may_have_been_made(self):
+        for error, answer in ((service.NoSuchUnit(), "no-such-unit"),
                               (service.NetError("said"), "failed"), (OSError("no"), "failed")):
             code = self.codes.issue("host01", None, 60, False)
             self.domain.error = error
@@ -251,6 +256,40 @@ class Requests(Folder):
             self.domain.error = None
             self.service._refusals = service.Refusals()
             self.assertEqual(("code-refused", False), self.error(self.account(code)))
+
+    def test_a_controller_that_does_not_answer_costs_no_code(self):
+        code = self.codes.issue("host01", None, 60, False)
+        self.domain.search_error = service.NetError("no controller")
+        self.assertEqual(("failed", False), self.error(self.account(code)))
+        self.domain.search_error = None
+        self.assertEqual("QkxPQg==", self.account(code)[1])
+
+    def test_an_account_that_exists_is_taken_over_on_request_alone(self):
+        self.domain.accounts = ["host01"]
+        code = self.codes.issue("host01", None, 60, False)
+        self.assertEqual(("account-exists", False), self.error(self.account(code)))
+        self.assertEqual([], self.domain.made)
+        code = self.codes.issue("host01", None, 60, True)
+        self.assertEqual("QkxPQg==", self.account(code)[1])
+        self.assertEqual([("host01", None, True)], self.domain.made)
+
+    def test_whether_an_account_exists_is_not_told_to_a_stranger(self):
+        self.domain.accounts = ["host01"]
+        self.codes.issue("host01", None, 60, False)
+        self.assertEqual(self.account("WRONG"), self.account("WRONG", host="host02"))
+
+    def test_a_unit_of_another_domain_costs_no_code(self):
+        code = self.codes.issue("host01", "OU=A,DC=other", 60, False)
+        self.assertEqual(("failed", False), self.error(self.account(code)))
+        self.assertIn("another domain", self.log[0])
+
+    def test_one_of_many_requests_with_a_code_makes_the_account(self):
+        code = self.codes.issue("host01", None, 60, False)
+        with concurrent.futures.ThreadPoolExecutor(8) as pool:
+            blobs = list(pool.map(lambda i: self.ask({"request": "account", "account": "host01"},
+                                                     code, f"192.0.2.{i}")[1], range(16)))
+        self.assertEqual(["QkxPQg=="], [blob for blob in blobs if blob])
+        self.assertEqual(1, len(self.domain.made))
 
     def test_who_guesses_is_not_heard_and_others_are(self):
         code = self.codes.issue("host01", None, 60, False)
