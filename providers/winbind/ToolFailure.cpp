@@ -19,7 +19,7 @@ struct KnownText {
 
 /// The first entry whose text occurs decides, so that what says most stands first: a tool often
 /// tries another way after a failure, and prints what came of both. Texts are compared without
-/// regard to case. Samba prints what a controller said as a name (NT_STATUS_..., WERR_...) or as the
+/// regard to case, and "*" stands for the rest of a line up to what follows. Samba prints what a controller said as a name (NT_STATUS_..., WERR_...) or as the
 /// sentence that belongs to it, and adds the texts of LDAP and Kerberos.
 constexpr KnownText KnownTexts[] = {
     // The account that asks. What is wrong with it is said only to who knows its password.
@@ -95,6 +95,9 @@ constexpr KnownText KnownTexts[] = {
     {"failed to leave realm: no such object", TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT},
     {"no_trust_lsa_secret", TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET},
     {"does not have a trust secret", TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET},
+    {"$@* failed: client not found",
+     TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT}, // of the host's account
+    {"$@* failed: preauthentication failed", TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET},
     {"cant_access_domain_info", TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET},
     {"unable to fetch domain sid: are we joined", TSLAUTH_PROVIDER_NO_TRUST_LSA_SECRET},
     {"domain_trust_inconsistent", TSLAUTH_PROVIDER_DOMAIN_TRUST_INCONSISTENT},
@@ -109,6 +112,7 @@ constexpr KnownText KnownTexts[] = {
     {"specified account does not exist", TSLAUTH_PROVIDER_LOGON_FAILURE},
     {"preauthentication failed", TSLAUTH_PROVIDER_LOGON_FAILURE},
     {"not found in kerberos database", TSLAUTH_PROVIDER_LOGON_FAILURE},
+    {"invalid_credentials", TSLAUTH_PROVIDER_LOGON_FAILURE},
     {"invalid credentials", TSLAUTH_PROVIDER_LOGON_FAILURE},
     {"password_restriction", TSLAUTH_PROVIDER_PASSWORD_RESTRICTION},
     {"password update rule has been violated", TSLAUTH_PROVIDER_PASSWORD_RESTRICTION},
@@ -183,12 +187,29 @@ bool IsDebugHeader(std::string_view line) {
            line.find("../../") != std::string_view::npos;
 }
 
+bool Occurs(std::string_view pattern, std::string_view text) {
+    auto const star = pattern.find('*');
+    auto const first = pattern.substr(0, star);
+    if (star == std::string_view::npos) {
+        return text.find(first) != std::string_view::npos;
+    }
+    auto const second = pattern.substr(star + 1);
+    for (auto found = text.find(first); found != std::string_view::npos;
+         found = text.find(first, found + 1)) {
+        auto rest = text.substr(found + first.size());
+        if (rest.substr(0, rest.find('\n')).find(second) != std::string_view::npos) {
+            return true;
+        }
+    }
+    return false;
+}
+
 } // namespace
 
 ActiveDirectoryClientErrorCode ToolFailureCode(std::string_view output) {
     std::string const text = Lower(output);
     for (auto const& known : KnownTexts) {
-        if (text.find(known.text) != std::string::npos) {
+        if (Occurs(known.text, text)) {
             return known.code;
         }
     }
