@@ -115,6 +115,10 @@ class Node:
             printf '%s\\tinclude\\tsystem-auth-generic\\n' auth account session >"/etc/pam.d/$2"
             """, LOCAL_PASSWORD, LOGIN_SERVICE)
 
+    def samba_tool(self, *arguments):
+        """A command of Samba's tool, which takes the first python3 that it finds otherwise."""
+        return self.ok("/usr/bin/python3", "/usr/bin/samba-tool", *arguments)
+
     def directory(self, query, *attributes):
         """What a controller's own database holds: a list of name -> values, where the name "dn" has
         one value."""
@@ -186,6 +190,14 @@ def at_once(function, *lists):
     """Calls the function for each item of the lists at the same time; a list of its results."""
     with concurrent.futures.ThreadPoolExecutor(max_workers=len(lists[0])) as pool:
         return list(pool.map(function, *lists))
+
+
+def until(what, holds, seconds=15):
+    """Asks until it holds."""
+    end = time.monotonic() + seconds
+    while not holds():
+        expect(time.monotonic() < end, f"not seen within {seconds} s: {what}")
+        time.sleep(0.05)
 
 
 def differences(before, after):

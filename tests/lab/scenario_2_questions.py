@@ -1,0 +1,272 @@
+# SPDX-License-Identifier: Apache-2.0
+"""Every question about the domain, beside what the controllers themselves say."""
+import json
+import re
+
+from lab import PASSWORD, at_once, expect, expect_equal, until
+
+TITLE = "The domain's answers, and what the controllers say"
+
+# The bits of a trust relationship, and the trust states, as tslauth_winbind_provider.h has them.
+IN_FOREST, TRANSITIVE, INBOUND, OUTBOUND = 1, 2, 4, 8
+HEALTHY, SECRET_REFUSED, NOT_RUNNING, NOT_JOINED = 0, 1, 3, 7
+DOMAINS = ("corp.example", "CORP", "other.example", "OTHER", "nowhere.example")
+NO_SUCH_DOMAIN = "NoSuchDomainException: "
+# Of the directory (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
+WITHIN_FOREST, FOREST_TRANSITIVE = 0x20, 0x8
+
+
+def ask(host):
+    """What the library tells: name -> text, and domain -> (name -> text)."""
+    result = host.library("ask", *DOMAINS)
+    expect_equal(result.code, 0, f"the exit code of\n{result}\n")
+    answers, about = {"preferred": []}, {}
+    current = answers
+    for line in result.out.splitlines():
+        name, _, text = line.partition("=")
+        if name == "about":
+            current = about.setdefault(text, {})
+        elif name == "preferred":
+            answers["preferred"].append(text)
+        else:
+            current[name] = text.strip()
+    return answers, about
+
+
+def info(host, code=0):
+    return json.loads(host.exits(code, "tslauthctl", "--json", "info").out)
+
+
+def state(host):
+    return int(ask(host)[0]["state"])
+
+
+def controllers_of(node, domain):
+    """As the controller's own DNS lists them."""
+    listing = node.ok("host", "-t", "SRV", f"_ldap._tcp.dc._msdcs.{domain}", "127.0.0.1").out
+    return re.findall(r"SRV record \d+ \d+ 389 (\S+)\.$", listing, re.MULTILINE)
+
+
+def trusts_of(node):
+    """As the controller's own directory has them: DNS name -> (NetBIOS name, bits)."""
+    trusts = {}
+    for trust in node.directory("(objectClass=trustedDomain)", "trustPartner", "flatName",
+                                "trustDirection", "trustAttributes"):
+        attributes = int(trust["trustAttributes"][0])
+        direction = int(trust["trustDirection"][0])
+        bits = (IN_FOREST if attributes & WITHIN_FOREST else 0) | \
+            (TRANSITIVE if attributes & (WITHIN_FOREST | FOREST_TRANSITIVE) else 0) | \
+            (INBOUND if direction & 1 else 0) | (OUTBOUND if direction & 2 else 0)
+        trusts[trust["trustPartner"][0]] = (trust["flatName"][0], bits)
+    return trusts
+
+
+def before_the_join(lab, host):
+    with lab.step("not joined: the library knows no domain, no account and no trusted domain"):
+        answers, about = ask(host)
+        expect_equal(answers["domain"], "DNS Name: (unset), NetBIOS Name: (unset)", "the domain")
+        expect_equal((answers["dn"], answers["trusted"]), ("", ""), "account and trusted domains")
+        expect_equal(about["corp.example"]["relationship"], "0", "the relationship")
+    with lab.step(f"not joined: the trust state is {NOT_JOINED}"):
+        expect_equal(state(host), NOT_JOINED, "the trust state")
+    with lab.step("not joined: tslauthctl info says so with exit code 10"):
+        document = info(host, 10)
+        expect_equal((document["joined"], document["trust_state"]), (False, NOT_JOINED), "joined")
+
+
+def own_domain(lab, host):
+    listing = lab.dc1.samba_tool("domain", "info", "127.0.0.1").out
+    own = dict(re.findall(r"^(.*\S)\s*: (.*)$", listing, re.MULTILINE))
+    account = lab.dc1.account_of(host)
+    answers, about = ask(host)
+    document = info(host)
+    with lab.step(f"the domain is {own['Domain']} ({own['Netbios domain']}), as samba-tool says"):
+        expect_equal(answers["domain"], f"DNS Name: {own['Domain']}, "
+                     f"NetBIOS Name: {own['Netbios domain']}", "the library's answer")
+        expect_equal(document["domain"], {"dns": own["Domain"], "netbios": own["Netbios domain"]},
+                     "tslauthctl's answer")
+    with lab.step(f"the account is {account['dn']}, as in the directory"):
+        expect_equal(answers["dn"], account["dn"], "the library's answer")
+        expect_equal(document["machine_account"], account["dn"], "tslauthctl's answer")
+    with lab.step("the trusted domains are those of samba-tool domain trust list"):
+        listing = lab.dc1.samba_tool("domain", "trust", "list").out
+        names = re.findall(r"Name\[(\S+)\]", listing)
+        trusts = trusts_of(lab.dc1)
+        expect(names and sorted(names) == sorted(trusts), f"{listing}{trusts}")
+        expect_equal(answers["trusted"].split(), [f"{name}/{trusts[name][0]}" for name in names],
+                     "the library's answer")
+        expect_equal(document["trusted_domains"],
+                     [{"dns": name, "netbios": trusts[name][0]} for name in names],
+                     "tslauthctl's answer")
+    with lab.step("the trust state is 0, and wbinfo --check-secret agrees"):
+        expect_equal((int(answers["state"]), document["trust_state"]), (HEALTHY, HEALTHY),
+                     "the answers of library and tslauthctl")
+        host.ok("wbinfo", "--check-secret")
+    return about
+
+
+def controllers(lab, host, about):
+    for node, domain, short in ((lab.dc1, "corp.example", "CORP"),
+                                (lab.dc2, "other.example", "OTHER")):
+        listed = controllers_of(node, domain)
+        with lab.step(f"a controller of {domain} is {', '.join(listed)}, as its DNS says"):
+            expect(listed, "DNS lists none")
+            for name in (domain, short):
+                expect(about[name]["dc"] in listed, f"the library: {about[name]['dc']}")
+                expect(host.tslauthctl("dc", name).out.strip() in listed, "tslauthctl says another")
+    with lab.step("nowhere.example has none: there is no such domain"):
+        expect(about["nowhere.example"]["dc"].startswith(NO_SUCH_DOMAIN),
+               about["nowhere.example"]["dc"])
+        host.exits(4, "tslauthctl", "dc", "nowhere.example")
+
+
+def relationships(lab, about):
+    for domain, (short, bits) in trusts_of(lab.dc1).items():
+        with lab.step(f"the trust to {domain} has the bits {bits}, as in the directory"):
+            expect(bits, "the directory has none")
+            for name in (domain, short):
+                expect_equal(int(about[name]["relationship"]), bits, f"the library's about {name}")
+    with lab.step("the own domain has all bits, and nowhere.example none"):
+        expect_equal([int(about[name]["relationship"]) for name in (DOMAINS[0], DOMAINS[-1])],
+                     [IN_FOREST | TRANSITIVE | INBOUND | OUTBOUND, 0], "the library's answers")
+
+
+def principal(lab, host, about):
+    expected = f"host/{host.name}.corp.example@CORP.EXAMPLE"
+    with lab.step(f"the principal is {expected} in every domain, and the account has it"):
+        for name in DOMAINS[:-1]:
+            expect_equal(about[name]["principal"], expected, f"the library's for {name}")
+            expect_equal(host.tslauthctl("principal", name).out.strip(), expected,
+                         f"tslauthctl's for {name}")
+        names = lab.dc1.account_of(host, "servicePrincipalName")["servicePrincipalName"]
+        expect(expected.partition("@")[0].lower() in [name.lower() for name in names], str(names))
+    for user in ("user1@CORP.EXAMPLE", "user2@OTHER.EXAMPLE"):
+        with lab.step(f"a controller gives {user} a ticket for it (kinit, kvno)"):
+            host.shell("""
+                export KRB5CCNAME=/run/lab.ticket
+                trap 'rm -f "$KRB5CCNAME"' EXIT
+                kinit "$1"
+                kvno "$2"
+                """, user, expected, text=PASSWORD + "\n")
+    with lab.step("there is none in nowhere.example: there is no such domain"):
+        expect(about["nowhere.example"]["principal"].startswith(NO_SUCH_DOMAIN),
+               about["nowhere.example"]["principal"])
+
+
+def canonical(lab, host):
+    lab.dc1.samba_tool("user", "create", f"ada-{host.name}", PASSWORD, "--given-name=Ada",
+                       f"--surname={host.name}", "--userou=OU=Linux,OU=Servers")
+    forms = {
+        "CORP\\user1": ("corp.example/Users/user1", "CORP\\user1", "user1@corp.example",
+                        "corp\\USER1", "corp.example\\user1"),
+        "OTHER\\user2": ("other.example/Users/user2", "OTHER\\user2", "user2@other.example"),
+        # In the directory she has another name than she logs in with.
+        f"CORP\\ada-{host.name}": (f"corp.example/Servers/Linux/Ada {host.name}",
+                                   f"ada-{host.name}@corp.example"),
+    }
+    for expected, names in forms.items():
+        node = lab.dc1 if expected.startswith("CORP") else lab.dc2
+        with lab.step(f"{expected} is what {', '.join(names)} are here"):
+            asked = host.library("canonical", *names)
+            expect_equal(asked.out.splitlines(), [f"{name}={expected}" for name in names],
+                         "the library's answers")
+            for name in names:
+                expect_equal(host.tslauthctl("canonical", name).out.strip(), expected,
+                             f"tslauthctl's for {name}")
+        with lab.step(f"{expected} is the user of that identifier on {node.name}"):
+            found = node.directory(f"(sAMAccountName={expected.partition(chr(92))[2]})",
+                                   "objectSid", "canonicalName")[0]
+            expect(found["canonicalName"][0] == names[0], str(found))
+            expect_equal(host.ok("wbinfo", "--name-to-sid", expected).out.split()[0],
+                         found["objectSid"][0], "the host's and the controller's")
+    for name, exception in (("CORP\\nobody", "NoSuchUserException"),
+                            ("corp.example/Users/nobody", "NoSuchUserException"),
+                            ("corp.example/Servers/user1", "NoSuchUserException"),
+                            ("user1@nowhere.example", "NoSuchDomainException"),
+                            ("user1", "InvalidAccountNameException")):
+        with lab.step(f"{name} is refused with {exception}"):
+            asked = host.library("canonical", name).out
+            expect(asked.startswith(f"{name}={exception}: Exception 0x"), asked)
+            host.exits(4, "tslauthctl", "canonical", name)
+
+
+def stop_winbindd(host):
+    host.shell('kill "$(cat /run/samba/winbindd.pid)"')
+    until("winbindd has ended", lambda: host.run("pgrep", "-x", "winbindd").code == 1)
+
+
+def start_winbindd(host):
+    host.ok("winbindd", "-D")
+    until("winbindd answers", lambda: host.run("wbinfo", "--ping").code == 0)
+
+
+def preferred(lab, host):
+    """The preferred controllers, through library and tool, in other processes than set them."""
+    lists = ["dc1.corp.example", "dc7.corp.example"], ["dc1.corp.example"], []
+    with lab.step("the library prefers two controllers, and tslauthctl knows them"):
+        result = host.library("prefer", *lists[0])
+        expect_equal((result.code, result.out), (0, ""), "what the library's call came to")
+        expect_equal(host.tslauthctl("preferred-dcs").out.split(), lists[0], "the list")
+        expect_equal(info(host)["preferred_domain_controllers"], lists[0], "the list of info")
+    with lab.step("tslauthctl prefers one, and the library knows it"):
+        host.tslauthctl("preferred-dcs", "set", *lists[1])
+        expect_equal(ask(host)[0]["preferred"], lists[1], "the list")
+    with lab.step("winbindd is to ask it first (testparm), and still answers"):
+        servers = host.ok("testparm", "-s", "--parameter-name=password server").out.split()
+        expect(servers[0].strip(",") == lists[1][0], str(servers))
+        until("the trust is healthy", lambda: state(host) == HEALTHY)
+    with lab.step("winbindd is stopped and started: it is still preferred"):
+        stop_winbindd(host)
+        start_winbindd(host)
+        expect_equal(ask(host)[0]["preferred"], lists[1], "the list")
+        until("the trust is healthy", lambda: state(host) == HEALTHY)
+    with lab.step("tslauthctl preferred-dcs clear: none is preferred"):
+        host.tslauthctl("preferred-dcs", "clear")
+        expect_equal(ask(host)[0]["preferred"], lists[2], "the list")
+        expect_equal(host.tslauthctl("preferred-dcs").out, "", "tslauthctl's list")
+
+
+def trust_states(lab, host):
+    with lab.step(f"winbindd is stopped: the trust state is {NOT_RUNNING}"):
+        stop_winbindd(host)
+        answers, about = ask(host)
+        expect_equal(int(answers["state"]), NOT_RUNNING, "the trust state")
+        expect(answers["trusted"].startswith("ServiceNotActiveException: Exception 0x00000426: "),
+               answers["trusted"])
+        expect(answers["domain"].startswith("DNS Name: corp.example,"), answers["domain"])
+        expect(about["corp.example"]["dc"].startswith("ServiceNotActiveException: "),
+               about["corp.example"]["dc"])
+    with lab.step("tslauthctl info says the same, and that it is not complete"):
+        document = info(host, 4)
+        expect_equal(document["trust_state"], NOT_RUNNING, "the trust state")
+        expect_equal([failure["exception"] for failure in document["failures"]],
+                     ["ServiceNotActiveException"], "the failures")
+    with lab.step(f"winbindd is started: the trust state is {HEALTHY}"):
+        start_winbindd(host)
+        until("the trust is healthy", lambda: state(host) == HEALTHY)
+    with lab.step(f"the controller changes the account's secret: the state is {SECRET_REFUSED}"):
+        lab.dc1.samba_tool("user", "setpassword", f"{host.name}$",
+                           "--newpassword=Another-Secret-1")
+        until("the secret is refused", lambda: state(host) == SECRET_REFUSED)
+        expect_equal(info(host)["trust_state"], SECRET_REFUSED, "tslauthctl's")
+    with lab.step(f"part and join give it a new one: the trust state is {HEALTHY}"):
+        host.part()
+        host.join()
+        expect_equal(state(host), HEALTHY, "the trust state")
+    with lab.step(f"the account is deleted on the controller: the trust state is {SECRET_REFUSED}"):
+        lab.dc1.samba_tool("computer", "delete", host.name)
+        until("the secret is refused", lambda: state(host) == SECRET_REFUSED)
+
+
+def play(lab):
+    host, other = lab.hosts(2)
+    before_the_join(lab, host)
+    with lab.step("two hosts join corp.example"):
+        at_once(lambda each: each.join(), (host, other))
+    about = own_domain(lab, host)
+    controllers(lab, host, about)
+    relationships(lab, about)
+    principal(lab, host, about)
+    canonical(lab, host)
+    preferred(lab, host)
+    trust_states(lab, other)
