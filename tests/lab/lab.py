@@ -237,6 +237,7 @@ class Lab:
     def __init__(self):
         self.passed = 0
         self.failed = 0
+        self._said = []
         self.dc1 = Node("dc1")
         self.dc2 = Node("dc2")
         self._next_host = 1 + max(
@@ -253,10 +254,15 @@ class Lab:
     def host(self):
         return self.hosts(1)[0]
 
+    def say(self, text):
+        """A line below the step that goes on."""
+        self._said.append(text)
+
     @contextlib.contextmanager
     def step(self, text):
         """One thing that is shown: what is done below it must not raise. The rest of the scenario
         goes on."""
+        self._said = []
         measures = Measures()
         try:
             yield measures
@@ -268,6 +274,8 @@ class Lab:
         else:
             self.passed += 1
             print(f"  ok  {text:<76} {measures}", flush=True)
+            for line in self._said:
+                print(f"      {line}", flush=True)
 
 
 def expect(condition, text):

@@ -1,0 +1,205 @@
+# SPDX-License-Identifier: Apache-2.0
+"""Hosts part and go back to local users, and every file is compared with what it was."""
+import fnmatch
+
+from lab import LOCAL_PASSWORD, LogIn, PASSWORD, at_once, differences, expect, expect_equal
+
+TITLE = "Parting, going back to \"None\", and what is left"
+
+# Everything that a program may have written: /usr and /var are overlays whose upper folders lie
+# below /run/node.
+FOLDERS = ("/etc", "/run", "/home", "/var/lib/samba", "/var/cache/samba", "/var/log/samba")
+
+# What differs from the original, by stage; a pattern stands for at least one path, and every path
+# has to have its pattern. The provider's README.md has the same list.
+JOIN = {
+    "/etc/hosts": "changed",
+    "/etc/samba/smb.conf": "changed",
+    "/etc/samba/tslauth.conf": "new",
+    "/etc/krb5.conf": "new",
+    "/etc/krb5.conf.d": "new",
+    "/etc/krb5.conf.d/tslauth.conf": "new",
+}
+ACTIVATION = {
+    "/etc/pam.d/system-auth-generic": "changed",
+    "/etc/nsswitch.conf": "changed",
+    "/etc/tessel/tslauth/authentication.conf": "changed",
+}
+# The entry of the management address in /etc/hosts stays, and the policy keeps the form in which
+# the library writes it.
+LEFT = {"/etc/hosts": "changed", "/etc/pam.d/system-auth-generic": "changed"}
+LOCKS = {"/run/tslauthctl.lock": "new", "/run/tslauth-winbind.lock": "new"}
+# What Samba's programs keep for themselves: databases, caches, logs and sockets.
+SAMBAS = {
+    "/run/samba/*": "new",
+    "/var/lib/samba/*.tdb": "new",
+    "/var/lib/samba/private/*.tdb": "new",
+    "/var/cache/samba/*.tdb": "new",
+    "/var/log/samba/*": "new",
+}
+
+# An administrator's own files, which hold more than a domain; the policy and the switch are in the
+# form in which the library writes them.
+SMB_CONF = """# The file server of the workshop
+[global]
+\tserver string = workshop
+\ttemplate shell = /bin/dash
+   idmap config * : range = 3000000-3999999
+   idmap config * : backend = tdb
+
+[data]
+\tpath = /srv/data ; and nothing else
+\tread only = no
+"""
+KRB5_CONF = """[libdefaults]
+\tdefault_realm = WORKSHOP.EXAMPLE
+
+[realms]
+\tWORKSHOP.EXAMPLE = {
+\t\tkdc = 192.0.2.7
+\t}"""
+
+
+def snapshot(host):
+    found = {}
+    for path, state in host.snapshot(*FOLDERS).items():
+        if path.startswith("/run/node"):
+            path = path[len("/run/node"):]
+            if not path.startswith(("/usr/", "/var/")):
+                continue
+        found[path] = state
+    return found
+
+
+def expect_differences(lab, before, after, *expected):
+    """Lists what differs, Samba's own files by their patterns, and compares it with the lists."""
+    patterns = {pattern: kind for each in expected for pattern, kind in each.items()}
+    seen, stray = {}, []
+    for path, kind in differences(before, after).items():
+        for pattern, kind_of_pattern in patterns.items():
+            if fnmatch.fnmatchcase(path, pattern) and kind == kind_of_pattern:
+                seen.setdefault(pattern, []).append(path)
+                break
+        else:
+            stray.append(f"{kind} {path}")
+    for pattern, paths in sorted(seen.items()):
+        number = f" ({len(paths)} files)" if "*" in pattern else ""
+        lab.say(f"{patterns[pattern]:8} {pattern}{number}")
+    missing = [f"{kind} {pattern}" for pattern, kind in patterns.items() if pattern not in seen]
+    expect(not stray and not missing,
+           "differs without a word: " + ", ".join(sorted(stray)) +
+           "\nsaid to differ and does not: " + ", ".join(sorted(missing)))
+
+
+def only_local_users(lab, when, host):
+    attempts = {user: LogIn(host, user, LOCAL_PASSWORD) for user in ("root", "lena")}
+    stranger = LogIn(host, "CORP\\user1", PASSWORD)
+    with lab.step(f"{host.name}, {when}: root and lena log in"):
+        for attempt in attempts.values():
+            attempt.is_let_in()
+    with lab.step(f"{host.name}, {when}: getent passwd knows no CORP\\user1, who is refused"):
+        host.exits(2, "getent", "passwd", "CORP\\user1")
+        stranger.is_refused("pamtester: ")
+
+
+def log_in_as_both(lab, host):
+    for user in ("CORP\\user1", "OTHER\\user2"):
+        with lab.step(f"{host.name}: {user} logs in") as step:
+            step.took(LogIn(host, user, PASSWORD).is_let_in())
+
+
+def knows_nothing(lab, host):
+    with lab.step(f"{host.name}: winbindd has ended, and the host keeps no secret of the domain"):
+        host.exits(1, "pgrep", "-x", "winbindd")
+        kept = host.ok("tdbdump", "/var/lib/samba/private/secrets.tdb").out
+        expect("MACHINE_PASSWORD" not in kept and "MACHINE_DOMAIN_INFO" not in kept,
+               "\n".join(line for line in kept.splitlines() if line.startswith("key")))
+    with lab.step(f"{host.name}: tslauthctl info says that it is not joined (exit code 10)"):
+        host.exits(10, "tslauthctl", "info")
+
+
+def same_entries(old, new):
+    """Whether two policies have the same entries in the same order for each facility."""
+    def entries(text):
+        words = [line.split() for line in text.splitlines() if line and not line.startswith("#")]
+        return sorted(words, key=lambda entry: entry[0])
+    expect_equal(entries(new), entries(old), "the policy's entries")
+
+
+def part_with_account(lab, host):
+    """A host as Debian leaves it."""
+    original = snapshot(host)
+    policy = host.read("/etc/pam.d/system-auth-generic")
+    with lab.step(f"{host.name}: join, and what differs from the original:"):
+        host.join()
+        expect_differences(lab, original, snapshot(host), JOIN, LOCKS, SAMBAS)
+    with lab.step(f"{host.name}: activate, and what differs from the original:"):
+        host.tslauthctl("activate", "Active Directory")
+        expect_differences(lab, original, snapshot(host), JOIN, ACTIVATION, LOCKS, SAMBAS)
+    log_in_as_both(lab, host)
+    with lab.step(f"{host.name}: part with a wrong password is refused, and the host is joined"):
+        before = host.snapshot("/etc", "/var/lib/samba/private")
+        host.exits(9, "tslauthctl", "part", "--user", "joiner1", "--password-stdin",
+                   text="Not-the-Passw0rd\n")
+        expect_equal(differences(before, host.snapshot("/etc", "/var/lib/samba/private")), {},
+                     "what the refused part changed")
+        expect(lab.dc1.account_of(host), "the account is gone")
+        host.tslauthctl("info")
+    with lab.step(f"{host.name}: part with an account, and what differs from the original:"):
+        host.part()
+        expect_differences(lab, original, snapshot(host), LEFT, ACTIVATION, LOCKS, SAMBAS)
+    with lab.step(f"{host.name}: the controller has deleted its account"):
+        expect_equal(lab.dc1.account_of(host), None, "the account")
+    knows_nothing(lab, host)
+    only_local_users(lab, "parted", host)
+    with lab.step(f"{host.name}: activate \"None\", and what differs from the original:"):
+        host.tslauthctl("activate", "None")
+        expect_differences(lab, original, snapshot(host), LEFT, LOCKS, SAMBAS)
+    with lab.step(f"{host.name}: the policy has the entries that it had"):
+        same_entries(policy, host.read("/etc/pam.d/system-auth-generic"))
+    only_local_users(lab, "\"None\"", host)
+    with lab.step(f"{host.name}: it can join again, and then part"):
+        host.join()
+        host.tslauthctl("info")
+        host.part()
+        expect_differences(lab, original, snapshot(host), LEFT, LOCKS, SAMBAS)
+
+
+def part_without_account(lab, host):
+    """A host whose administrator has settings of his own, and where the store is active first."""
+    host.write("/etc/samba/smb.conf", SMB_CONF, "0640")
+    host.write("/etc/krb5.conf", KRB5_CONF)
+    host.tslauthctl("preferred-dcs", "set", "dc1.corp.example")
+    host.tslauthctl("activate", "Active Directory")
+    host.tslauthctl("activate", "None")
+    original = snapshot(host)
+    with lab.step(f"{host.name}, with settings of its administrator: activate, then join"):
+        host.tslauthctl("activate", "Active Directory")
+        host.join("corp.example", "--skip-hostname-check")
+    log_in_as_both(lab, host)
+    with lab.step(f"{host.name}: the administrator's settings hold"):
+        for user in ("CORP\\user1", "OTHER\\user2"):
+            expect_equal(host.ok("getent", "passwd", user).out.strip().split(":")[6], "/bin/dash",
+                         f"the shell of {user}")
+        expect(SMB_CONF.partition("[data]")[2] in host.read("/etc/samba/smb.conf"), "no [data]")
+        number = int(host.ok("id", "-u", "OTHER\\user2").out)
+        expect(3000000 <= number < 4000000, f"OTHER\\user2 has the number {number}")
+    with lab.step(f"{host.name}: the library's PartDomain, without an account"):
+        result = host.library("part")
+        expect_equal((result.code, result.out), (0, ""), "what the library's call came to")
+    knows_nothing(lab, host)
+    only_local_users(lab, "parted", host)
+    with lab.step(f"{host.name}: activate \"None\": every file of /etc is as it was"):
+        host.tslauthctl("activate", "None")
+        expect_differences(lab, original, snapshot(host), SAMBAS)
+    with lab.step(f"{host.name}: it still prefers dc1.corp.example"):
+        expect_equal(host.tslauthctl("preferred-dcs").out, "dc1.corp.example\n", "the list")
+    with lab.step(f"{host.name}: its account stands on the controller"):
+        expect(lab.dc1.account_of(host), "the account is gone")
+
+
+def play(lab):
+    debian, workshop = lab.hosts(2)
+    at_once(lambda host: host.make_local_users(), (debian, workshop))
+    part_with_account(lab, debian)
+    part_without_account(lab, workshop)
