@@ -81,7 +81,7 @@ void CheckPart(std::string_view unit, std::string const& value) {
 }
 
 /// The parts of a path, from top to bottom. A backslash takes the slash or backslash behind it as
-/// it is; in front of anything else it is what `others` says: refused, or itself.
+/// it is; in front of anything else it is what `lone` says.
 enum class LoneBackslash { refused, literal };
 std::optional<std::vector<std::string>> SplitPath(std::string_view path, LoneBackslash lone) {
     std::vector<std::string> parts(1);
@@ -184,11 +184,14 @@ std::vector<Part> SplitDistinguishedName(std::string_view unit) {
     }
 }
 
+/// Whether the text means to be a distinguished name: nothing but what a type is made of stands in
+/// front of its first "=".
 bool IsDistinguishedName(std::string_view unit) {
-    auto const type = Trimmed(unit.substr(0, unit.find('=')));
-    return type.size() < unit.size() && unit.find('=') != std::string_view::npos && !type.empty() &&
-           std::all_of(type.begin(), type.end(),
-                       [](char c) { return IsLetter(c) || IsDigit(c) || c == '.' || c == '-'; });
+    auto const equals = unit.find('=');
+    auto const type = Trimmed(unit.substr(0, equals));
+    return equals != std::string_view::npos && std::all_of(type.begin(), type.end(), [](char c) {
+               return IsLetter(c) || IsDigit(c) || c == '.' || c == '-';
+           });
 }
 
 std::string Joined(std::vector<Part> const& parts) {
