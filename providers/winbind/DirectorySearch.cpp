@@ -3,6 +3,7 @@
 
 #include "ChildProcess.h"
 #include "Failure.h"
+#include "TextPieces.h"
 #include "ToolFailure.h"
 
 namespace tessel::winbind {
@@ -17,11 +18,10 @@ std::vector<DirectoryEntry> ReadDirectoryEntries(std::string_view text) {
     std::vector<DirectoryEntry> entries;
     bool hasBegun = false;
     while (!text.empty()) {
-        std::size_t const end = text.find('\n');
-        std::string_view const line = text.substr(0, end);
-        text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
+        std::string_view line = TextPieces::TakeLine(text);
+        line.remove_suffix(TextPieces::EndsWith(line, "\n") ? 1 : 0);
         std::size_t const colon = line.find(": ");
-        if (line.substr(0, 4) == "Got ") {
+        if (TextPieces::StartsWith(line, "Got ")) {
             hasBegun = true;
             entries.clear();
         } else if (line.empty()) {

@@ -6,6 +6,7 @@
 #include "DirectoryNames.h"
 #include "DirectorySearch.h"
 #include "Failure.h"
+#include "TextPieces.h"
 #include "WinbindClient.h"
 #include "tslauth_winbind_provider.h"
 
@@ -14,6 +15,7 @@
 #include <memory>
 #include <netdb.h>
 #include <optional>
+#include <string_view>
 #include <syslog.h>
 
 namespace tessel::winbind {
@@ -21,6 +23,10 @@ namespace tessel::winbind {
 namespace {
 
 using authentication::Domain;
+using TextPieces::EndsWith;
+using TextPieces::EqualsIgnoringCase;
+using TextPieces::Lower;
+using TextPieces::Upper;
 typedef BoundedCall::Clock Clock;
 
 /// How long winbindd may take to answer what it knows without a controller.
@@ -30,30 +36,16 @@ Clock::time_point Deadline() {
     return Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_QUESTION_SECONDS);
 }
 
-char Lower(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
-std::string Lower(std::string text) {
-    std::transform(text.begin(), text.end(), text.begin(), [](char c) { return Lower(c); });
-    return text;
-}
-
-std::string Upper(std::string text) {
-    std::transform(text.begin(), text.end(), text.begin(), [](char c) {
-        return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
-    });
-    return text;
+/// A DNS name without the dot of the root.
+std::string_view WithoutRoot(std::string_view name) {
+    return EndsWith(name, ".") ? name.substr(0, name.size() - 1) : name;
 }
 
 /// Whether `name` is one of the names of `domain`.
-bool Names(std::string const& name, Domain const& domain) {
-    std::string wanted = Lower(name);
-    if (!wanted.empty() && wanted.back() == '.') {
-        wanted.pop_back();
-    }
-    return !wanted.empty() &&
-           (wanted == Lower(domain.DNSName()) || wanted == Lower(domain.NetBIOSName()));
+bool Names(std::string_view name, Domain const& domain) {
+    std::string_view const wanted = WithoutRoot(name);
+    return !wanted.empty() && (EqualsIgnoringCase(wanted, domain.DNSName()) ||
+                               EqualsIgnoringCase(wanted, domain.NetBIOSName()));
 }
 
 /// The host's domain; nothing where it has none.
@@ -115,15 +107,40 @@ std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& ow
                                    std::string const& name, Clock::time_point deadline) {
     std::string const controller =
         Names(domain.DNSName(), own) ? "" : client.FindDomainController(domain.DNSName(), "");
+    // Directories differ in what they escape, and the name itself was searched for.
+    auto const plain = [](std::string value) {
+        value.erase(std::remove(value.begin(), value.end(), '\\'), value.end());
+        return Lower(value);
+    };
+    std::vector<std::string> accounts;
     for (DirectoryEntry const& entry : SearchDirectory(
              controller,
              "(&(objectCategory=person)(objectClass=user)(cn=" + EscapedForFilter(name) + "))",
              {"canonicalName", "sAMAccountName"}, deadline)) {
-        if (Lower(ValueIn(entry, "canonicalName")) == Lower(text)) {
-            return ValueIn(entry, "sAMAccountName");
+        if (plain(ValueIn(entry, "canonicalName")) == plain(text)) {
+            accounts.push_back(ValueIn(entry, "sAMAccountName"));
         }
     }
-    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER, "there is no user '" + text + "'");
+    if (accounts.size() != 1) {
+        throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER, "there is no single user '" + text + "'");
+    }
+    return accounts.front();
+}
+
+/// The user of the principal name `text`. What it is of need not be a domain, nor what stands before
+/// it an account's name: a controller knows both by the user's own attribute. Only where it does not,
+/// they are taken as they look.
+std::string UserOfPrincipal(WinbindClient const& client, Domain const& own, UserName const& user,
+                            std::string const& text) {
+    std::optional<Domain> const domain = FindDomain(client, own, user.domain);
+    try {
+        return client.GetUserName((domain ? *domain : own).NetBIOSName(), text);
+    } catch (Failure const& failure) {
+        if (failure.Code() != TSLAUTH_PROVIDER_NO_SUCH_USER) {
+            throw;
+        }
+    }
+    return client.GetUserName(FindDomainOrThrow(client, own, user.domain).NetBIOSName(), user.name);
 }
 
 /// This host's full name, as the join has registered it: what the resolver says of the machine's
@@ -254,7 +271,7 @@ std::string GetAnyDomainController(std::string const& site, std::string const& d
     try {
         // By its DNS name, where it has one: that is the name that sites and DNS know.
         return client.FindDomainController(
-            known && !known->DNSName().empty() ? known->DNSName() : domain, site);
+            known && !known->DNSName().empty() ? known->DNSName() : DomainName(domain), site);
     } catch (Failure const& failure) {
         // winbindd has one answer for a domain that it cannot find and for one that is silent.
         if (known && failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_DOMAIN) {
@@ -269,17 +286,19 @@ std::string ConvertCanonicalUsername(std::string const& name) {
     UserName const user = ReadUserName(name);
     Domain const own = JoinedOrThrow();
     WinbindClient const client(deadline);
-    Domain const domain = FindDomainOrThrow(client, own, user.domain);
     switch (user.form) {
-    case UserName::Form::canonical:
+    case UserName::Form::canonical: {
+        Domain const domain = FindDomainOrThrow(client, own, user.domain);
         return client.GetUserName(
             domain.NetBIOSName(),
             AccountOfCanonicalName(client, own, domain, name, user.name, deadline));
-    case UserName::Form::downLevel:
+    }
     case UserName::Form::principal:
+        return UserOfPrincipal(client, own, user, name);
+    case UserName::Form::downLevel:
         break;
     }
-    return client.GetUserName(domain.NetBIOSName(), user.name);
+    return client.GetUserName(FindDomainOrThrow(client, own, user.domain).NetBIOSName(), user.name);
 }
 
 std::string GetHostPrincipalForDomain(std::string const& domain) {
@@ -302,7 +321,7 @@ int GetDomainTrustRelationship(std::string const& domain) {
                TSLAUTH_WINBIND_TRUST_INBOUND | TSLAUTH_WINBIND_TRUST_OUTBOUND;
     }
     // winbindd, on a member, knows neither direction nor kind.
-    std::string const name = EscapedForFilter(domain);
+    std::string const name = EscapedForFilter(DomainName(domain));
     std::vector<DirectoryEntry> const trusts = SearchDirectory(
         "", "(&(objectClass=trustedDomain)(|(trustPartner=" + name + ")(flatName=" + name + ")))",
         {"trustDirection", "trustAttributes"}, deadline);

@@ -4,9 +4,9 @@
 #include "Failure.h"
 
 #include <cstddef>
-#include <cstdio>
 #include <memory>
 #include <new>
+#include <utility>
 
 namespace tessel::winbind {
 
@@ -21,26 +21,51 @@ struct Release {
 
 template <typename T> using Owned = std::unique_ptr<T, Release>;
 
-struct CloseContext {
-    void operator()(wbcContext* context) const {
-        wbcCtxFree(context);
+/// A connection to winbindd, for one question.
+class Connection {
+public:
+    explicit Connection(std::string question) : _question(std::move(question)) {
+        _context.reset(wbcCtxCreate());
+        if (_context == nullptr) {
+            throw std::bad_alloc();
+        }
     }
+
+    wbcContext* Context() const {
+        return _context.get();
+    }
+
+    Failure Failed(ActiveDirectoryClientErrorCode code, std::string const& why) const {
+        return {code, _question + ": " + why};
+    }
+
+    void Check(wbcErr error) const {
+        // winbindd hangs up when it has waited too long for a controller ("winbind request timeout"
+        // in smb.conf(5)), which libwbclient cannot tell from a winbindd that does not run.
+        if (error == WBC_ERR_WINBIND_NOT_AVAILABLE && wbcCtxPing(Context()) == WBC_ERR_SUCCESS) {
+            throw Failed(TSLAUTH_PROVIDER_TIMED_OUT, "winbindd waited for a controller in vain");
+        }
+        if (error != WBC_ERR_SUCCESS) {
+            throw Failed(CodeOfWinbind(error), wbcErrorString(error));
+        }
+    }
+
+private:
+    struct Close {
+        void operator()(wbcContext* context) const {
+            wbcCtxFree(context);
+        }
+    };
+
+    std::string _question;
+    std::unique_ptr<wbcContext, Close> _context;
 };
 
-typedef std::unique_ptr<wbcContext, CloseContext> Context;
-
-Context NewContext() {
-    Context context(wbcCtxCreate());
-    if (context == nullptr) {
-        throw std::bad_alloc();
-    }
-    return context;
-}
-
-void Check(char const* question, wbcErr error) {
-    if (error != WBC_ERR_SUCCESS) {
-        throw Failure(CodeOfWinbind(error), std::string(question) + ": " + wbcErrorString(error));
-    }
+/// Calls `ask` with a connection, within the bound.
+template <typename Question>
+auto Ask(std::string const& question, BoundedCall::Clock::time_point deadline, Question ask) {
+    return BoundedCall::Run(question, deadline,
+                            [question, ask] { return ask(Connection(question)); });
 }
 
 std::string TextOrEmpty(char const* text) {
@@ -135,14 +160,14 @@ ActiveDirectoryClientErrorCode CodeOfNTStatus(std::uint32_t status) {
 WinbindClient::WinbindClient(BoundedCall::Clock::time_point deadline) : _deadline(deadline) {}
 
 void WinbindClient::Ping() const {
-    BoundedCall::Run("winbindd", _deadline,
-                     [] { Check("winbindd", wbcCtxPing(NewContext().get())); });
+    Ask("winbindd", _deadline,
+        [](Connection const& winbindd) { winbindd.Check(wbcCtxPing(winbindd.Context())); });
 }
 
 WinbindClient::Host WinbindClient::GetHost() const {
-    return BoundedCall::Run("the host's names", _deadline, [] {
+    return Ask("the host's names", _deadline, [](Connection const& winbindd) {
         struct wbcInterfaceDetails* found = nullptr;
-        Check("the host's names", wbcCtxInterfaceDetails(NewContext().get(), &found));
+        winbindd.Check(wbcCtxInterfaceDetails(winbindd.Context(), &found));
         Owned<struct wbcInterfaceDetails> const details(found);
         return Host{TextOrEmpty(details->netbios_name),
                     {TextOrEmpty(details->dns_domain), TextOrEmpty(details->netbios_domain)}};
@@ -150,31 +175,29 @@ WinbindClient::Host WinbindClient::GetHost() const {
 }
 
 void WinbindClient::CheckTrustCredentials() const {
-    BoundedCall::Run("the check of the host's secret", _deadline, [] {
+    Ask("the check of the host's secret", _deadline, [](Connection const& winbindd) {
         wbcAuthErrorInfo* found = nullptr;
-        wbcErr const error = wbcCtxCheckTrustCredentials(NewContext().get(), nullptr, &found);
+        wbcErr const error = wbcCtxCheckTrustCredentials(winbindd.Context(), nullptr, &found);
         Owned<wbcAuthErrorInfo> const info(found);
         if (error == WBC_ERR_AUTH_ERROR && info != nullptr) {
-            throw Failure(CodeOfNTStatus(info->nt_status),
-                          "the check of the host's secret: " + TextOrEmpty(info->nt_string));
+            throw winbindd.Failed(CodeOfNTStatus(info->nt_status), TextOrEmpty(info->nt_string));
         }
-        Check("the check of the host's secret", error);
+        winbindd.Check(error);
     });
 }
 
 std::vector<WinbindClient::Domain> WinbindClient::ListDomains() const {
-    return BoundedCall::Run("the list of domains", _deadline, [] {
+    return Ask("the list of domains", _deadline, [](Connection const& winbindd) {
         struct wbcDomainInfo* found = nullptr;
         std::size_t count = 0;
-        Check("the list of domains", wbcCtxListTrusts(NewContext().get(), &found, &count));
+        winbindd.Check(wbcCtxListTrusts(winbindd.Context(), &found, &count));
         Owned<struct wbcDomainInfo> const infos(found);
         std::vector<Domain> domains;
         domains.reserve(count);
         for (std::size_t i = 0; i < count; ++i) {
             struct wbcDomainInfo const& info = infos.get()[i];
-            domains.push_back({{TextOrEmpty(info.dns_name), TextOrEmpty(info.short_name)},
-                               info.trust_flags,
-                               info.trust_type});
+            domains.push_back(
+                {{TextOrEmpty(info.dns_name), TextOrEmpty(info.short_name)}, info.trust_type});
         }
         return domains;
     });
@@ -183,14 +206,12 @@ std::vector<WinbindClient::Domain> WinbindClient::ListDomains() const {
 namespace {
 
 /// What winbindd finds out about a controller of `domain`, in `site` if that is not empty.
-Owned<wbcDomainControllerInfoEx> LookUpController(std::string const& domain,
-                                                  std::string const& site) {
+Owned<wbcDomainControllerInfoEx>
+LookUpController(Connection const& winbindd, std::string const& domain, std::string const& site) {
     wbcDomainControllerInfoEx* found = nullptr;
-    std::string const question = "a controller of '" + domain + "'";
-    Check(question.c_str(),
-          wbcCtxLookupDomainControllerEx(
-              NewContext().get(), domain.c_str(), nullptr, site.empty() ? nullptr : site.c_str(),
-              WBC_LOOKUP_DC_DS_REQUIRED | WBC_LOOKUP_DC_RETURN_DNS_NAME, &found));
+    winbindd.Check(wbcCtxLookupDomainControllerEx(
+        winbindd.Context(), domain.c_str(), nullptr, site.empty() ? nullptr : site.c_str(),
+        WBC_LOOKUP_DC_DS_REQUIRED | WBC_LOOKUP_DC_RETURN_DNS_NAME, &found));
     return Owned<wbcDomainControllerInfoEx>(found);
 }
 
@@ -198,41 +219,40 @@ Owned<wbcDomainControllerInfoEx> LookUpController(std::string const& domain,
 
 std::string WinbindClient::FindDomainController(std::string const& domain,
                                                 std::string const& site) const {
-    return BoundedCall::Run("a controller of '" + domain + "'", _deadline, [domain, site] {
-        std::string const name = TextOrEmpty(LookUpController(domain, site)->dc_unc);
-        std::size_t const start = name.find_first_not_of('\\');
-        if (start == std::string::npos) {
-            throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
-                          "a controller of '" + domain + "': the one found has no name");
-        }
-        return name.substr(start);
-    });
+    return Ask(
+        "a controller of '" + domain + "'", _deadline, [domain, site](Connection const& winbindd) {
+            std::string const name = TextOrEmpty(LookUpController(winbindd, domain, site)->dc_unc);
+            std::size_t const start = name.find_first_not_of('\\');
+            if (start == std::string::npos) {
+                throw winbindd.Failed(TSLAUTH_PROVIDER_NO_LOGON_SERVERS, "it has no name");
+            }
+            return name.substr(start);
+        });
 }
 
 std::string WinbindClient::GetForest(std::string const& domain) const {
-    return BoundedCall::Run("the forest of '" + domain + "'", _deadline, [domain] {
-        return TextOrEmpty(LookUpController(domain, "")->forest_name);
+    return Ask("the forest of '" + domain + "'", _deadline, [domain](Connection const& winbindd) {
+        return TextOrEmpty(LookUpController(winbindd, domain, "")->forest_name);
     });
 }
 
 std::string WinbindClient::GetUserName(std::string const& domain, std::string const& name) const {
-    std::string const question = "the user '" + domain + "\\" + name + "'";
-    return BoundedCall::Run(question, _deadline, [domain, name, question] {
-        Context const context = NewContext();
-        wbcDomainSid sid = {};
-        wbcSidType type = WBC_SID_NAME_USE_NONE;
-        wbcErr const error =
-            wbcCtxLookupName(context.get(), domain.c_str(), name.c_str(), &sid, &type);
-        if (error == WBC_ERR_DOMAIN_NOT_FOUND ||
-            (error == WBC_ERR_SUCCESS && type != WBC_SID_NAME_USER)) {
-            throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER, question + ": there is none");
-        }
-        Check(question.c_str(), error);
-        passwd* found = nullptr;
-        Check(question.c_str(), wbcCtxGetpwsid(context.get(), &sid, &found));
-        Owned<passwd> const entry(found);
-        return TextOrEmpty(entry->pw_name);
-    });
+    return Ask("the user '" + name + "' of '" + domain + "'", _deadline,
+               [domain, name](Connection const& winbindd) {
+                   wbcDomainSid sid = {};
+                   wbcSidType type = WBC_SID_NAME_USE_NONE;
+                   wbcErr const error = wbcCtxLookupName(winbindd.Context(), domain.c_str(),
+                                                         name.c_str(), &sid, &type);
+                   if (error == WBC_ERR_DOMAIN_NOT_FOUND ||
+                       (error == WBC_ERR_SUCCESS && type != WBC_SID_NAME_USER)) {
+                       throw winbindd.Failed(TSLAUTH_PROVIDER_NO_SUCH_USER, "there is none");
+                   }
+                   winbindd.Check(error);
+                   passwd* found = nullptr;
+                   winbindd.Check(wbcCtxGetpwsid(winbindd.Context(), &sid, &found));
+                   Owned<passwd> const entry(found);
+                   return TextOrEmpty(entry->pw_name);
+               });
 }
 
 } // namespace tessel::winbind

@@ -39,7 +39,6 @@ public:
 
     struct Domain {
         authentication::Domain names; // the DNS name is empty for a domain that has none
-        std::uint32_t trustFlags;     // WBC_DOMINFO_TRUST_...
         std::uint32_t trustType;      // WBC_DOMINFO_TRUSTTYPE_...
     };
 
