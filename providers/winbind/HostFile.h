@@ -1,0 +1,76 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+/// The host's files: read whole, replaced whole, put back.
+namespace tessel::winbind {
+
+/// @throws Failure 5, 8 or `SeeSystemLog`, with what + ": " + the system's text for `error`
+[[noreturn]] void ThrowSystemFailure(std::string const& what, int error);
+
+/// The bytes of a file, or nothing where there is none.
+/// @throws Failure where it cannot be read
+std::optional<std::string> ReadHostFile(std::string const& path);
+
+bool FileExists(std::string const& path);
+
+/// Where there is none, there is nothing to do.
+/// @throws Failure
+void RemoveHostFile(std::string const& path);
+
+/// Makes the entries of the folder that holds `path` durable, as far as its file system does that.
+void SyncFolderOf(std::string const& path) noexcept;
+
+/// Changes of the host that are taken back, in reverse order, unless they are kept. Taking back is
+/// done with what was set aside before, and needs no room on a disk.
+///
+/// An original is set aside as a second link beside its file. What a process that dies in between
+/// leaves is put back by `RestoreOriginals`.
+class HostChanges {
+public:
+    HostChanges() = default;
+    HostChanges(HostChanges const&) = delete;
+    HostChanges& operator=(HostChanges const&) = delete;
+    /// Takes back what was not kept.
+    ~HostChanges();
+
+    /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner and mode,
+    /// and a link to it stays a link.
+    /// @param mode for a new file
+    /// @throws Failure, and the file is as it was
+    void Replace(std::string const& path, std::string const& text, mode_t mode);
+
+    /// Removes a file, if there is one.
+    void Remove(std::string const& path);
+
+    /// Makes a folder, if there is none.
+    /// @return whether it was made
+    bool MakeFolder(std::string const& path, mode_t mode);
+
+    /// Whatever else is to be taken back in its turn.
+    void OnUndo(std::function<void()> step);
+
+    /// The changes are the host's from now on.
+    void Keep() noexcept;
+
+    /// Takes all changes back. What fails is logged, and the rest goes on.
+    /// @return whether everything was taken back
+    bool Undo() noexcept;
+
+private:
+    std::vector<std::function<void()>> _undo;
+    std::vector<std::string> _originals;
+};
+
+/// Puts the originals of `paths` back that a `HostChanges` without an end has left.
+void RestoreOriginals(std::vector<std::string> const& paths);
+
+/// Removes what is only on its way in the folders of `paths`, originals included.
+void RemoveTemporaryFiles(std::vector<std::string> const& paths);
+
+} // namespace tessel::winbind

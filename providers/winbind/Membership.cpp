@@ -1,0 +1,79 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Membership.h"
+
+#include "DirectoryNames.h"
+#include "Failure.h"
+#include "HostFile.h"
+#include "Paths.h"
+
+#include <algorithm>
+#include <climits>
+#include <unistd.h>
+#include <utility>
+
+namespace tessel::winbind {
+
+namespace {
+
+constexpr char recordStart[] = "# Parting also takes away: ";
+
+constexpr std::pair<Membership::Made, char const*> words[] = {
+    {Membership::Made::SambaFile, "smb.conf"},
+    {Membership::Made::KerberosFile, "krb5.conf"},
+    {Membership::Made::KerberosFolder, "krb5.conf.d"},
+    {Membership::Made::Daemon, "winbindd"},
+};
+
+std::set<Membership::Made> ReadRecord(std::string const& text) {
+    std::set<Membership::Made> made;
+    std::string::size_type const start = text.rfind(recordStart);
+    if (start == std::string::npos) {
+        return made;
+    }
+    std::string const line = text.substr(start, text.find('\n', start) - start) + ' ';
+    for (auto const& [what, word] : words) {
+        if (line.find(std::string(" ") + word + ' ') != std::string::npos) {
+            made.insert(what);
+        }
+    }
+    return made;
+}
+
+} // namespace
+
+std::string Membership::DNSName() const {
+    return DomainName(domain.realm);
+}
+
+std::optional<Membership> Membership::Read() {
+    auto const own = ReadHostFile(Paths::OwnSamba);
+    if (!own) {
+        return std::nullopt;
+    }
+    auto const samba = ReadHostFile(Paths::Samba);
+    auto domain = ReadSambaDomain(*own);
+    if (!samba || !domain || !HasSambaInclude(*samba, Paths::OwnSamba)) {
+        return std::nullopt;
+    }
+    return Membership{std::move(*domain), ReadRecord(*own)};
+}
+
+std::string Membership::Record(std::set<Made> const& made) {
+    std::string line;
+    for (auto const& [what, word] : words) {
+        if (made.count(what) != 0) {
+            line += (line.empty() ? "" : " ") + std::string(word);
+        }
+    }
+    return line.empty() ? line : recordStart + line + '\n';
+}
+
+std::string HostComputerName() {
+    char name[HOST_NAME_MAX + 1] = {};
+    if (::gethostname(name, sizeof name - 1) != 0) {
+        throw Failure(TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME, "the host's name cannot be read");
+    }
+    return ComputerName(name);
+}
+
+} // namespace tessel::winbind

@@ -1,0 +1,37 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+/// Every fixed path and key of the provider, in one table. The administrator's documents name them.
+namespace tessel::winbind::Paths {
+
+/// The administrator's; a join adds an include, and a part takes it out again.
+inline constexpr char Samba[] = "/etc/samba/smb.conf";
+inline constexpr char Kerberos[] = "/etc/krb5.conf";
+
+/// The provider's own, there as long as the host is joined.
+inline constexpr char OwnSamba[] = "/etc/samba/tslauth.conf";
+inline constexpr char OwnKerberosFolder[] = "/etc/krb5.conf.d";
+inline constexpr char OwnKerberos[] = "/etc/krb5.conf.d/tslauth.conf";
+
+/// What stays over joins and parts: `PreferredControllersKey`, the names with blanks between them.
+inline constexpr char State[] = "/etc/tessel/tslauth/winbind.conf";
+inline constexpr char PreferredControllersKey[] = "preferred-domain-controllers";
+
+/// In Samba's private folder: the machine's secrets, and the same file as it was before the join
+/// (empty where there was none), which a part puts back.
+inline constexpr char Secrets[] = "secrets.tdb";
+inline constexpr char SecretsBeforeJoin[] = "tslauth-before-join.tdb";
+
+/// Held by every operation that changes the host.
+inline constexpr char Lock[] = "/run/tslauth-winbind.lock";
+/// A folder of each join and part, with six more characters. Its owner alone can look into it.
+inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";
+
+/// Names of files that are on their way to their place, or kept until it is sure that they are not
+/// needed again, begin so.
+inline constexpr char TemporaryPrefix[] = ".tslauth-";
+inline constexpr char OriginalSuffix[] = ".original";
+
+inline constexpr char SystemdRunning[] = "/run/systemd/system";
+
+} // namespace tessel::winbind::Paths

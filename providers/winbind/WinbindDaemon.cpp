@@ -1,0 +1,169 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "WinbindDaemon.h"
+
+#include "Failure.h"
+#include "HostFile.h"
+#include "Paths.h"
+#include "SystemLog.h"
+#include "ToolFailure.h"
+#include "WinbindClient.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <csignal>
+#include <cstdlib>
+#include <string_view>
+#include <thread>
+#include <unistd.h>
+#include <utility>
+#include <vector>
+
+namespace tessel::winbind {
+
+namespace {
+
+constexpr char program[] = "winbindd";
+constexpr char unit[] = "winbind.service";
+constexpr auto pause = std::chrono::milliseconds(25);
+constexpr auto longPause = std::chrono::milliseconds(250);
+/// What it is given to end by itself.
+constexpr auto politeness = std::chrono::seconds(5);
+constexpr auto onePing = std::chrono::seconds(2);
+
+bool SystemdManages() {
+    return FileExists(Paths::SystemdRunning) && !ChildProcess::Find("systemctl").empty();
+}
+
+ChildProcess::Outcome RunSystemctl(std::vector<std::string> const& arguments,
+                                   Clock::time_point deadline) {
+    ChildProcess::Task task;
+    task.arguments = {"systemctl", "--no-ask-password"};
+    task.arguments.insert(task.arguments.end(), arguments.begin(), arguments.end());
+    return ChildProcess::Run(task, deadline);
+}
+
+void RequireSuccess(std::string const& what, ChildProcess::Outcome const& outcome) {
+    if (outcome.timedOut) {
+        throw Failure(TSLAUTH_PROVIDER_TIMED_OUT, what + " did not end in time");
+    }
+    if (outcome.code != 0) {
+        throw Failure(TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE,
+                      what + ": " + ToolFailureText(outcome.output));
+    }
+}
+
+/// The file that a process executes; empty where there is no such process.
+std::string ExecutableOf(pid_t process) {
+    std::array<char, PATH_MAX> path = {};
+    ssize_t const length =
+        ::readlink(("/proc/" + std::to_string(process) + "/exe").c_str(), path.data(), path.size());
+    return length > 0 ? std::string(path.data(), static_cast<std::size_t>(length)) : std::string();
+}
+
+bool WaitForEnd(pid_t process, Clock::time_point deadline) {
+    while (::kill(process, 0) == 0) {
+        if (Clock::now() >= deadline) {
+            return false;
+        }
+        std::this_thread::sleep_for(pause);
+    }
+    return true;
+}
+
+} // namespace
+
+WinbindDaemon::WinbindDaemon(std::string pidFolder) : _pidFolder(std::move(pidFolder)) {}
+
+pid_t WinbindDaemon::Process() const {
+    std::string const text = ReadHostFile(_pidFolder + '/' + program + ".pid").value_or("");
+    auto const process = static_cast<pid_t>(std::strtol(text.c_str(), nullptr, 10));
+    if (process <= 1) {
+        return 0;
+    }
+    // The file may be older than the system's start, and the number somebody else's by now. A
+    // program that was replaced since it was started has a word behind its path.
+    std::string const path = ExecutableOf(process);
+    std::string_view name = std::string_view(path).substr(path.rfind('/') + 1);
+    name = name.substr(0, name.find(' '));
+    return name == program ? process : 0;
+}
+
+bool WinbindDaemon::Runs() const {
+    return Process() != 0;
+}
+
+void WinbindDaemon::StopProcess(Clock::time_point deadline) const {
+    pid_t const process = Process();
+    if (process == 0) {
+        return;
+    }
+    (void)::kill(process, SIGTERM); // it may have ended by itself; the wait tells
+    if (WaitForEnd(process, std::min(deadline, Clock::now() + politeness))) {
+        return;
+    }
+    (void)::kill(process, SIGKILL); // likewise
+    if (!WaitForEnd(process, Clock::now() + politeness)) {
+        throw Failure(TSLAUTH_PROVIDER_SERVICE_CANNOT_ACCEPT_CONTROL, "winbindd cannot be stopped");
+    }
+}
+
+void WinbindDaemon::Stop(Clock::time_point deadline) const {
+    if (SystemdManages()) {
+        // A unit that is unknown here has nothing to stop.
+        (void)RunSystemctl({"stop", unit}, deadline);
+    }
+    StopProcess(deadline);
+}
+
+void WinbindDaemon::Restart(Clock::time_point deadline) const {
+    if (SystemdManages()) {
+        RequireSuccess("systemctl restart", RunSystemctl({"restart", unit}, deadline));
+    } else {
+        StopProcess(deadline);
+        ChildProcess::Task task;
+        task.arguments = {program, "-D"};
+        RequireSuccess(program, ChildProcess::Run(task, deadline));
+    }
+    for (;;) {
+        auto const now = Clock::now();
+        try {
+            WinbindClient(std::min(deadline, now + onePing)).Ping();
+            return;
+        } catch (Failure const& e) {
+            if (now + pause >= deadline) {
+                throw Failure(TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE,
+                              std::string("winbindd does not answer: ") + e.what());
+            }
+        }
+        std::this_thread::sleep_for(pause);
+    }
+}
+
+void WinbindDaemon::Reload() const noexcept {
+    try {
+        pid_t const process = Process();
+        if (process != 0) {
+            (void)::kill(process, SIGHUP); // where it has just ended, there is nobody to tell
+        }
+    } catch (std::exception const& e) {
+        LogWarning(std::string("winbindd is not told of its new configuration: ") + e.what());
+    }
+}
+
+void WinbindDaemon::CheckTrust(Clock::time_point deadline) {
+    for (;;) {
+        try {
+            WinbindClient(deadline).CheckTrustCredentials();
+            return;
+        } catch (Failure const&) {
+            if (Clock::now() + longPause >= deadline) {
+                throw;
+            }
+        }
+        std::this_thread::sleep_for(longPause);
+    }
+}
+
+} // namespace tessel::winbind
