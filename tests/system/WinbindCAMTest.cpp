@@ -7,6 +7,7 @@
 #include <tslauth/CAMProxy.h>
 #include <tslauth/Exceptions.h>
 
+#include <arpa/inet.h>
 #include <chrono>
 #include <csignal>
 #include <dlfcn.h>
@@ -14,9 +15,11 @@
 #include <functional>
 #include <gmock/gmock.h>
 #include <memory>
+#include <netinet/in.h>
 #include <regex>
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/socket.h>
 #include <sys/wait.h>
 #include <thread>
 
@@ -360,6 +363,16 @@ TEST_F(WinbindCAMTest, AVerifiedChainNeedsNoPin) {
         CAMProxy("winbind-cam", Server, true, "").CreateMachineAccount("host01", "").firstResult);
 }
 
+TEST_F(WinbindCAMTest, ACertificateMayBeItsOwnAuthority) {
+    Output("openssl req -x509 -newkey rsa:2048 -nodes -days 2 -subj /CN=cam -addext "
+           "subjectAltName=IP:127.0.0.1 -keyout " +
+           File("self", ".key") + " -out " + File("self", ".pem") + " 2>&1 && chmod 0600 " +
+           File("self", ".key"));
+    auto const service = Serve("self");
+    TrustAuthority("self");
+    EXPECT_EQ("corp.example", CAMProxy("winbind-cam", Server, true, "").GetDNSDomainName());
+}
+
 TEST_F(WinbindCAMTest, TheSystemsAuthoritiesServeWhereThereAreNoOthers) {
     auto const service = Serve();
     CAMProxy const proxy("winbind-cam", Server, true, "");
@@ -612,6 +625,31 @@ TEST_F(WinbindCAMTest, ThreadsOfAProcessMayAskAtOnce) {
     }
 }
 
+TEST_F(WinbindCAMTest, OneAddressDoesNotTakeEveryConnection) {
+    auto const service = Serve("good", {"--address", "127.0.0.1"});
+    // Silent ones, which the service waits for.
+    std::vector<int> sockets;
+    for (int i = 0; i < 40; ++i) {
+        int const one = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        sockaddr_in address = {};
+        address.sin_family = AF_INET;
+        address.sin_port = htons(8989);
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        ASSERT_EQ(0, connect(one, reinterpret_cast<sockaddr const*>(&address), sizeof address));
+        sockets.push_back(one);
+    }
+    EXPECT_THAT(NameFailure(Pinned()), IsBroken);
+    EXPECT_THAT(service->Log(), HasSubstr("127.0.0.1: not heard, too many connections"));
+    for (int const one : sockets) {
+        close(one);
+    }
+    auto const end = steady_clock::now() + std::chrono::seconds(10);
+    while (NameFailure(Pinned()).code != 0 && steady_clock::now() < end) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+    EXPECT_EQ("corp.example", Pinned().GetDNSDomainName());
+}
+
 TEST_F(WinbindCAMTest, AServiceThatIsKilledInTheMiddleHasTakenTheCode) {
     auto service = Serve();
     GiveCode("--host host01");
@@ -650,6 +688,39 @@ TEST_F(WinbindCAMTest, AServiceThatIsToldToEndAnswersFirst) {
     fs::remove(StandIn + "/hangs");
     asking.join();
     ending.join();
+}
+
+TEST_F(WinbindCAMTest, RootIssuesCodesForAServiceThatIsNot) {
+    fs::create_directories(State());
+    ASSERT_EQ(0, chmod(State().c_str(), 0700));
+    ASSERT_EQ(0, chmod(_folder.Path().c_str(), 0711));
+    ASSERT_EQ(0, chown(State().c_str(), 65534, 65534));
+    (void)IssueCode("--host host01 --unit Servers --reuse");
+    EXPECT_EQ("HOST01\tServers\t60 min\treuse",
+              Output("setpriv --reuid=65534 --regid=65534 --clear-groups /usr/bin/python3 -B " +
+                     Sources + "/cam-service/tslauth-cam-service list-codes --state " + State()));
+}
+
+TEST_F(WinbindCAMTest, TheServiceKeepsItsSecretsFromOthers) {
+    struct {
+        std::string file;
+        mode_t mode;
+    } const open[] = {
+        {_folder / "credentials", 0640}, {File("good", ".key"), 0644}, {State(), 0750}};
+    fs::create_directories(State());
+    ASSERT_EQ(0, chmod(State().c_str(), 0700));
+    for (auto const& one : open) {
+        struct stat before = {};
+        ASSERT_EQ(0, stat(one.file.c_str(), &before));
+        ASSERT_EQ(0, chmod(one.file.c_str(), one.mode));
+        EXPECT_THAT(Output("/usr/bin/python3 -B " + Sources +
+                           "/cam-service/tslauth-cam-service serve --certificate " +
+                           File("good", ".pem") + " --key " + File("good", ".key") +
+                           " --credentials " + (_folder / "credentials") + " --state " + State() +
+                           " --net-program /bin/false 2>&1; test $? = 1"),
+                    AllOf(HasSubstr(one.file), HasSubstr("alone")));
+        ASSERT_EQ(0, chmod(one.file.c_str(), before.st_mode & 07777));
+    }
 }
 
 TEST_F(WinbindCAMTest, NothingButTheRecordIsExported) {
