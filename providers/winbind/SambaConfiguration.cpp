@@ -18,9 +18,11 @@ namespace {
 constexpr std::string_view Comment =
     "# Written by tslauth: the domain that this host is joined to. It stays the last of [global].";
 
-/// In place of `Comment` where an empty line had to end a continued one first.
-constexpr std::string_view CommentBelowEmptyLine =
-    "# Written by tslauth, with the empty line above: the domain that this host is joined to.";
+/// In place of `Comment` where empty lines had to end a continued one first; with their number in
+/// between.
+constexpr std::string_view CommentBelowEmptyLines =
+    "# Written by tslauth, with empty lines above (";
+constexpr std::string_view CommentBelowEmptyLinesEnd = "): the domain that this host is joined to.";
 
 constexpr std::string_view Header = "[global]";
 
@@ -31,7 +33,7 @@ struct Line {
     std::size_t begin;
     std::size_t end;          ///< behind the line feed, if there is one
     bool global;              ///< whether it belongs to a [global] section; its header does
-    bool continuesAtEnd;      ///< whether what is appended to the text would go on with it
+    std::size_t openAtEnd;    ///< how many empty lines it takes to end it, at the end of the text
     std::string name;         ///< of a parameter: in lower case, without blanks
     std::string_view content; ///< of a blank line or a comment, without its line end
     std::string value;        ///< of a parameter
@@ -47,20 +49,43 @@ std::string NormalisedName(std::string_view name) {
     return result;
 }
 
-/// The text of a line and of those it is continued on, without the backslashes and line ends
-/// between them.
-std::string TakeContinuedLine(std::string_view& rest, bool& continuesAtEnd) {
+/// How many empty lines it takes to end a line that a backslash continues: each of the backslashes
+/// that stand at its end then, with blanks or without, continues it once more.
+std::size_t EmptyLinesToEnd(std::string_view text) {
+    std::size_t lines = 1;
+    for (text = TrimmedRight(text); EndsWith(text, "\\"); text = TrimmedRight(text)) {
+        text.remove_suffix(1);
+        ++lines;
+    }
+    return lines;
+}
+
+/// The text of a line and of those it is continued on. What decides is the end of the whole text so
+/// far, so that a backslash that an empty line follows may come to stand there. A run of blanks is
+/// one blank.
+/// @param openAtEnd as in `Line`
+std::string TakeContinuedLine(std::string_view& rest, std::size_t& openAtEnd) {
     std::string text;
-    do {
+    while (!rest.empty()) {
         auto const line = TakeLine(rest);
-        auto const content = TrimmedRight(line);
-        continuesAtEnd = !content.empty() && content.back() == '\\';
-        if (!continuesAtEnd || (rest.empty() && line.back() != '\n')) {
-            text += content; // a backslash that ends the text stands for itself
-            break;
+        for (char const c : line) {
+            bool const isBlank = WhiteSpace.find(c) != std::string_view::npos;
+            if (!isBlank || (!text.empty() && text.back() != ' ')) {
+                text += isBlank ? ' ' : c;
+            }
         }
-        text += content.substr(0, content.size() - 1);
-    } while (!rest.empty());
+        auto const content = TrimmedRight(text);
+        if (!EndsWith(content, "\\")) {
+            openAtEnd = 0;
+            return text;
+        }
+        if (rest.empty() && line.back() != '\n') {
+            openAtEnd = EmptyLinesToEnd(content) - 1; // the line end itself will count for one
+            return text; // a backslash that ends the text stands for itself
+        }
+        text.resize(content.size() - 1);
+        openAtEnd = EmptyLinesToEnd(text);
+    }
     return text;
 }
 
@@ -68,7 +93,7 @@ std::vector<Line> Lines(std::string_view text) {
     std::vector<Line> lines;
     bool global = true;
     for (auto rest = text; !rest.empty();) {
-        Line line{Line::Kind::blank, text.size() - rest.size(), 0, global, false, {}, {}, {}};
+        Line line{Line::Kind::blank, text.size() - rest.size(), 0, global, 0, {}, {}, {}};
         auto ahead = rest;
         auto const physical = TakeLine(ahead);
         auto const content = Trimmed(physical);
@@ -77,8 +102,7 @@ std::vector<Line> Lines(std::string_view text) {
             line.content = physical.substr(0, physical.find_last_not_of("\r\n") + 1);
             rest = ahead;
         } else {
-            auto const whole = TakeContinuedLine(rest, line.continuesAtEnd);
-            line.continuesAtEnd = line.continuesAtEnd && rest.empty();
+            auto const whole = TakeContinuedLine(rest, line.openAtEnd);
             auto const joined = Trimmed(whole);
             if (!joined.empty() && joined[0] == '[') {
                 line.kind = Line::Kind::section;
@@ -115,21 +139,44 @@ Line const* LastGlobal(std::vector<Line> const& lines) {
     return last == lines.rend() ? nullptr : &*last;
 }
 
+std::optional<std::uint64_t> Number(std::string_view text) {
+    if (text.empty() || text.size() > 10 || !std::all_of(text.begin(), text.end(), IsDigit)) {
+        return std::nullopt;
+    }
+    std::uint64_t number = 0;
+    for (char const c : text) {
+        number = number * 10 + static_cast<std::uint64_t>(c - '0');
+    }
+    return number;
+}
+
+/// How many empty lines a comment of ours says to stand above it; nothing where it is not ours.
+std::optional<std::size_t> AddedEmptyLines(std::string_view comment) {
+    if (comment == Comment) {
+        return 0;
+    }
+    if (!StartsWith(comment, CommentBelowEmptyLines) ||
+        !EndsWith(comment, CommentBelowEmptyLinesEnd)) {
+        return std::nullopt;
+    }
+    comment.remove_prefix(CommentBelowEmptyLines.size());
+    auto const lines = Number(comment.substr(0, comment.find(')')));
+    return lines ? std::optional(static_cast<std::size_t>(*lines)) : std::nullopt;
+}
+
 /// Where what WithSambaInclude() added with the line `include` begins.
 std::size_t BeginOfAdded(std::string_view text, std::vector<Line> const& lines,
                          std::size_t include) {
     auto const content = [&](std::size_t back) {
         return include < back ? std::string_view() : lines[include - back].content;
     };
-    bool const belowEmptyLine = content(1) == CommentBelowEmptyLine;
-    if (belowEmptyLine || content(1) == Comment) {
+    if (auto const emptyLines = AddedEmptyLines(content(1))) {
         Line const& comment = lines[include - 1];
         std::string_view const lineEnd = LineEnd(text.substr(0, comment.end).substr(comment.begin));
-        // The line end that a text without its last one was given, and the one that ended a
-        // continued line.
-        int const added = (text[lines[include].end - 1] == '\n' ? 0 : 1) + (belowEmptyLine ? 1 : 0);
+        // Those of the empty lines, and the one that a text without its last one was given.
+        std::size_t added = *emptyLines + (text[lines[include].end - 1] == '\n' ? 0 : 1);
         std::size_t begin = comment.begin;
-        for (int i = 0; i < added && EndsWith(text.substr(0, begin), lineEnd); ++i) {
+        for (; added > 0 && EndsWith(text.substr(0, begin), lineEnd); --added) {
             begin -= lineEnd.size();
         }
         return begin;
@@ -241,17 +288,6 @@ void AddIdmaps(GlobalSection& section, std::string const& workgroup,
     }
 }
 
-std::optional<std::uint64_t> Number(std::string_view text) {
-    if (text.empty() || text.size() > 10 || !std::all_of(text.begin(), text.end(), IsDigit)) {
-        return std::nullopt;
-    }
-    std::uint64_t number = 0;
-    for (char const c : text) {
-        number = number * 10 + static_cast<std::uint64_t>(c - '0');
-    }
-    return number;
-}
-
 std::optional<SambaSettings::Range> ReadRange(std::string_view text) {
     auto const hyphen = text.find('-');
     if (hyphen == std::string_view::npos) {
@@ -353,10 +389,15 @@ std::string WithSambaInclude(std::string_view text, std::string_view path) {
     }
     bool const complete = text[last->end - 1] == '\n';
     std::string addition = complete ? "" : lineEnd;
-    if (last->continuesAtEnd) {
-        addition += lineEnd + std::string(CommentBelowEmptyLine);
-    } else {
+    for (std::size_t i = 0; i < last->openAtEnd; ++i) {
+        addition += lineEnd;
+    }
+    if (last->openAtEnd == 0) {
         addition += Comment;
+    } else {
+        addition += CommentBelowEmptyLines;
+        addition += std::to_string(last->openAtEnd);
+        addition += CommentBelowEmptyLinesEnd;
     }
     // Without a last line end where there was none, which is how WithoutSambaInclude() knows.
     addition += lineEnd + include + (complete ? lineEnd : "");

@@ -109,7 +109,14 @@ TEST(SambaConfigurationTest, CommentsAreNotContinuedButParametersAre) {
     EXPECT_FALSE(settings.Sets("security"));
     EXPECT_EQ(settings.Value("realm"), "B;C");
     EXPECT_EQ(settings.Value("workgroup"), "W # part of the value");
-    EXPECT_EQ(settings.Value("netbios name"), "X  Y");
+    EXPECT_EQ(settings.Value("netbios name"), "X Y");
+}
+
+TEST(SambaConfigurationTest, ABackslashInFrontOfAnEmptyLineContinuesOnceMore) {
+    SambaSettings const settings("realm = A\\\\\n\nB\nworkgroup = W\\ \\\n\n\nsecurity = user\n");
+    EXPECT_EQ(settings.Value("realm"), "AB");
+    EXPECT_EQ(settings.Value("workgroup"), "W");
+    EXPECT_EQ(settings.Value("security"), "user");
 }
 
 TEST(SambaConfigurationTest, ABackslashAtTheEndOfTheTextStandsForItself) {
