@@ -6,6 +6,7 @@
 #include "DirectoryNames.h"
 #include "DirectorySearch.h"
 #include "Failure.h"
+#include "SystemLog.h"
 #include "TextPieces.h"
 #include "WinbindClient.h"
 #include "tslauth_winbind_provider.h"
@@ -16,7 +17,6 @@
 #include <netdb.h>
 #include <optional>
 #include <string_view>
-#include <syslog.h>
 
 namespace tessel::winbind {
 
@@ -236,7 +236,7 @@ int GetDomainTrustState() {
     try {
         WinbindClient(std::min(deadline, Clock::now() + pingTime)).Ping();
     } catch (Failure const& failure) {
-        syslog(LOG_WARNING, "winbind: get domain trust state: %s", failure.what());
+        LogWarning("get domain trust state: " + std::string(failure.what()));
         return failure.Code() == TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE
                    ? TSLAUTH_WINBIND_TRUST_NOT_RUNNING
                    : TSLAUTH_WINBIND_TRUST_NOT_ANSWERING;
@@ -245,7 +245,7 @@ int GetDomainTrustState() {
         WinbindClient(deadline).CheckTrustCredentials();
         return TSLAUTH_WINBIND_TRUST_HEALTHY;
     } catch (Failure const& failure) {
-        syslog(LOG_WARNING, "winbind: get domain trust state: %s", failure.what());
+        LogWarning("get domain trust state: " + std::string(failure.what()));
         return TrustStateOf(failure.Code());
     }
 }

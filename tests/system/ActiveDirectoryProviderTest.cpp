@@ -246,6 +246,8 @@ TEST_F(ActiveDirectoryProviderTest, EveryTestProviderIsKnownHere) {
                   "libversion-0.so",
                   "libversion-1.so",
                   "libversion-negative.so",
+                  "libwinbind-cam.so",
+                  "libwinbind.so",
                   "libwords.so",
               }),
               found);

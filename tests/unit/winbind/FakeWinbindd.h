@@ -20,8 +20,8 @@
 #include <unistd.h>
 #include <vector>
 
-/// libwbclient takes the socket's folder from the environment in a program that has this function:
-/// the name-service wrapper of Samba's own tests does.
+/// libwbclient takes the socket's folder from the environment in a program that exports this
+/// function: the name-service wrapper of Samba's own tests does.
 extern "C" __attribute__((visibility("default"))) bool nss_wrapper_enabled(); // NOLINT: its name
 
 /// A winbindd that answers as it is told, for this program's libwbclient.
@@ -63,16 +63,22 @@ public:
         };
     }
 
-    explicit FakeWinbindd(Script script) : _script(std::move(script)) {
-        EXPECT_EQ(0, chmod(_folder.Path().c_str(), 0755));
+    /// @param folder where the socket is; empty: in a folder of this object's, which the environment
+    ///     names to libwbclient
+    explicit FakeWinbindd(Script script, std::string folder = "") : _script(std::move(script)) {
+        if (folder.empty()) {
+            folder = _folder.Path();
+        }
+        EXPECT_EQ(0, chmod(folder.c_str(), 0755));
         sockaddr_un address = {};
         address.sun_family = AF_UNIX;
-        std::string const path = _folder.Path() + "/pipe";
+        std::string const path = folder + "/pipe";
+        (void)unlink(path.c_str()); // one that an earlier object has left
         path.copy(address.sun_path, sizeof address.sun_path - 1);
         _listener = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
         EXPECT_EQ(0, bind(_listener, reinterpret_cast<sockaddr const*>(&address), sizeof address));
         EXPECT_EQ(0, listen(_listener, 64));
-        EXPECT_EQ(0, setenv("SELFTEST_WINBINDD_SOCKET_DIR", _folder.Path().c_str(), 1));
+        EXPECT_EQ(0, setenv("SELFTEST_WINBINDD_SOCKET_DIR", folder.c_str(), 1));
         _thread = std::thread([this] { Serve(); });
     }
 
@@ -107,7 +113,7 @@ private:
             }
         }
         for (pollfd const& each : open) {
-            (void)close(each.fd);
+            (void)close(each.fd); // the listener among them
         }
     }
 
