@@ -94,7 +94,10 @@ Parameters ReadSlowly(std::string const& text) {
 std::string Describe(Parameters const& parameters, SambaSettings const& settings) {
     std::string text;
     for (auto const& [name, value] : parameters) {
-        text += name + '=' + WithoutBlanks(settings.Value(name).value_or("(not set)")) + '\n';
+        text += name;
+        text += '=';
+        text += WithoutBlanks(settings.Value(name).value_or("(not set)"));
+        text += '\n';
     }
     return text;
 }
@@ -102,7 +105,10 @@ std::string Describe(Parameters const& parameters, SambaSettings const& settings
 std::string Describe(Parameters const& parameters) {
     std::string text;
     for (auto const& [name, value] : parameters) {
-        text += name + '=' + value + '\n';
+        text += name;
+        text += '=';
+        text += value;
+        text += '\n';
     }
     return text;
 }

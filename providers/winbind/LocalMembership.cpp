@@ -179,8 +179,8 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
         made.insert(Made::SambaFile);
     }
     changes.Replace(Paths::OwnSamba,
-                    SambaDomainText(domain.samba, AdministratorSettings(samba.value_or(""))) +
-                        Membership::Record(made),
+                    Membership::Record(made) +
+                        SambaDomainText(domain.samba, AdministratorSettings(samba.value_or(""))),
                     0644);
     changes.Replace(Paths::Samba, WithSambaInclude(samba.value_or(""), Paths::OwnSamba), 0644);
 

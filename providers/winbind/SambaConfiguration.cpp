@@ -496,16 +496,26 @@ std::string WithPreferredControllers(std::string_view text,
     }
     std::string result(text);
     auto const lines = Lines(text);
-    std::size_t place = std::string::npos;
+    std::size_t header = std::string::npos;
+    std::size_t membership = std::string::npos;
+    std::size_t replaced = std::string::npos;
     for (std::size_t i = lines.size(); i-- > 0;) {
-        if (lines[i].name == "passwordserver") {
-            result.erase(lines[i].begin, lines[i].end - lines[i].begin);
-            place = lines[i].begin;
-        } else if (lines[i].name == "kerberosmethod" && place == std::string::npos) {
-            place = lines[i].end;
+        if (lines[i].kind == Line::Kind::section) {
+            header = lines[i].end;
+        } else if (lines[i].name == "kerberosmethod") {
+            membership = lines[i].end;
+        } else if (lines[i].name == "passwordserver") {
+            replaced = lines[i].begin;
+            result.erase(replaced, lines[i].end - replaced);
         }
     }
-    return place == std::string::npos ? result : result.insert(place, setting);
+    // Where the setting was; else where it would be; else anywhere in the section.
+    for (std::size_t const place : {replaced, membership, header}) {
+        if (place != std::string::npos) {
+            return result.insert(place, setting);
+        }
+    }
+    return result;
 }
 
 } // namespace tessel::winbind

@@ -235,6 +235,16 @@ TEST(SambaConfigurationTest, PreferredControllersChangeAndNothingElse) {
     EXPECT_EQ(WithPreferredControllers(none, {}), none);
 }
 
+TEST(SambaConfigurationTest, PreferredControllersAreKeptAlsoInAFileThatWasEdited) {
+    EXPECT_EQ(WithPreferredControllers("# c\n[global]\n\trealm = A\n", {"dc1"}),
+              "# c\n[global]\n\tpassword server = dc1 *\n\trealm = A\n");
+    EXPECT_EQ(WithPreferredControllers("[global]\npassword server = a\n\tkerberos method = x\n"
+                                       "Password Server = b\n",
+                                       {"dc1"}),
+              "[global]\n\tpassword server = dc1 *\n\tkerberos method = x\n");
+    EXPECT_EQ(WithPreferredControllers("", {"dc1"}), "");
+}
+
 TEST(SambaConfigurationTest, AStagedConfigurationKeepsEverythingBelowItsDirectory) {
     SambaDomain domain = Corp;
     domain.preferredControllers = {"dc1"};
