@@ -13,6 +13,7 @@ LOCAL_SLACK = 0.1
 
 # User, password, what is shown, and what the user is told where the answer is no.
 NO = "pamtester: Authentication failure"
+UNKNOWN = "pamtester: User not known to the underlying authentication module"
 LOCAL_USERS = (
     ("root", LOCAL_PASSWORD, "logs in", None),
     ("root", PASSWORD, "is refused with a wrong password", NO),
@@ -31,11 +32,11 @@ DOMAIN_USERS = (
      "Your account has expired"),
     ("CORP\\mustchange1", PASSWORD, "who must change the password first is refused",
      "new one required"),
-    ("CORP\\nobody", PASSWORD, "whom nobody knows is refused", "pamtester: "),
+    ("CORP\\nobody", PASSWORD, "whom nobody knows is refused", UNKNOWN),
 )
 STRANGERS = (
-    ("CORP\\user1", PASSWORD, "is refused", "pamtester: "),
-    ("OTHER\\user2", PASSWORD, "is refused", "pamtester: "),
+    ("CORP\\user1", PASSWORD, "is refused", UNKNOWN),
+    ("OTHER\\user2", PASSWORD, "is refused", UNKNOWN),
 )
 
 
