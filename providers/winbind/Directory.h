@@ -43,7 +43,7 @@ authentication::Domain GetActiveDomain();
 std::string GetMachineAccountDN();
 
 /// The controllers of `domain` as its DNS lists them, the preferred ones that it lists first.
-/// Asks DNS alone, within 5 seconds.
+/// Asks DNS alone, within 8 seconds.
 std::vector<std::string> FindDomainControllers(std::string const& domain);
 
 } // namespace tessel::winbind

@@ -32,8 +32,7 @@ public:
             throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
                           "'" + domain + "': the resolver cannot be set up");
         }
-        _state.retrans = 1;
-        _state.retry = 2;
+        _state.nscount = std::min(_state.nscount, 2);
         // An answer that a datagram cannot hold still names enough of the controllers. A connection
         // would be waited for without an end.
         _state.options |= RES_IGNTC | RES_USE_EDNS0;
@@ -47,14 +46,24 @@ public:
     std::string Services(std::string const& domain) {
         std::string const name = "_ldap._tcp.dc._msdcs." + domain + '.';
         std::vector<unsigned char> answer(NS_MAXMSG);
-        errno = 0;
-        int const length = ::res_nquery(&_state, name.c_str(), ns_c_in, ns_t_srv, answer.data(),
-                                        static_cast<int>(answer.size()));
-        if (length >= 0) {
-            auto const size = std::min(answer.size(), static_cast<std::size_t>(length));
-            return {answer.begin(), answer.begin() + static_cast<std::ptrdiff_t>(size)};
+        int error = 0;
+        // A lost datagram costs a second. The longer wait is for a server that is not there at all:
+        // the kernel needs three seconds to be sure of that.
+        for (int const seconds : {1, 3}) {
+            _state.retrans = seconds;
+            _state.retry = 1;
+            errno = 0;
+            int const length = ::res_nquery(&_state, name.c_str(), ns_c_in, ns_t_srv, answer.data(),
+                                            static_cast<int>(answer.size()));
+            error = errno;
+            if (length >= 0) {
+                auto const size = std::min(answer.size(), static_cast<std::size_t>(length));
+                return {answer.begin(), answer.begin() + static_cast<std::ptrdiff_t>(size)};
+            }
+            if (_state.res_h_errno != TRY_AGAIN || error != ETIMEDOUT) {
+                break;
+            }
         }
-        int const error = errno;
         if (_state.res_h_errno == TRY_AGAIN && error == ETIMEDOUT) {
             throw Failure(TSLAUTH_PROVIDER_TIMED_OUT, "DNS does not answer for '" + name + "'");
         }

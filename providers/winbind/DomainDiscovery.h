@@ -16,7 +16,7 @@ class SambaTools;
 namespace DomainDiscovery {
 
 /// The controllers of `domain` in the order of DNS (priority, then weight). No state of the C
-/// library's resolver is shared, and no answer is waited for longer than about 6 seconds.
+/// library's resolver is shared, and no answer is waited for longer than 8 seconds.
 /// @throws Failure 1355 where DNS knows no such domain or cannot be asked, 10060 where it is silent
 std::vector<std::string> AskDNS(std::string const& domain);
 

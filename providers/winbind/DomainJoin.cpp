@@ -53,6 +53,14 @@ SambaDomain Guess(std::string const& domain, std::string const& computer) {
             {}};
 }
 
+/// A join could not be finished without it.
+void RequireWinbindd() {
+    if (ChildProcess::Find("winbindd").empty()) {
+        throw Failure(TSLAUTH_PROVIDER_SERVICE_DOES_NOT_EXIST,
+                      "the program 'winbindd' is not installed");
+    }
+}
+
 void RequireNotJoined(Clock::time_point deadline) {
     if (auto const membership = Membership::Read()) {
         throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED,
@@ -63,7 +71,7 @@ void RequireNotJoined(Clock::time_point deadline) {
         throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED, "this host is a domain controller");
     }
     // An administrator may have written the settings of a member and never joined.
-    if (folders.isDomainMember && SambaTools("").HasMachineSecret(deadline)) {
+    if (folders.isDomainMember && SambaTools().HasMachineSecret(deadline)) {
         throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED,
                       std::string("this host is joined by other means; '") + Paths::Samba +
                           "' says to which domain");
@@ -85,12 +93,13 @@ class Join {
 public:
     Join(std::string domain, std::string computer)
         : _deadline(WorkDeadline()), _domain(std::move(domain)), _computer(std::move(computer)),
-          _lock(_deadline), _tools("") {
+          _lock(_deadline) {
+        RequireWinbindd();
         LocalMembership::CleanUp(_deadline);
         RequireNotJoined(_deadline);
         _staging.emplace();
-        _staging->Configure(Guess(_domain, _computer));
-        _tools = SambaTools(_staging->Configuration());
+        _staging->Configure(Guess(_domain, _computer), _domain, {});
+        _tools = SambaTools(*_staging);
     }
 
     /// @param first asked before the preferred controllers; may be empty
@@ -102,7 +111,8 @@ public:
         _controller = DomainDiscovery::FindController(_tools, _domain, preferred, _deadline);
         auto const ahead = DomainDiscovery::CheckClock(_tools, _controller.controller, _deadline);
         _begin = GeneralizedTime(std::chrono::system_clock::now() + ahead - clockTolerance);
-        _staging->Configure({_controller.Realm(), _controller.netBIOSDomain, _computer, {}});
+        _staging->Configure({_controller.Realm(), _controller.netBIOSDomain, _computer, {}},
+                            _domain, {_controller.controller});
         // So that what others keep there comes along.
         SambaFolders const folders = SambaFolders::Read(_deadline);
         if (auto const secrets = ReadHostFile(folders.secrets + '/' + Paths::Secrets)) {

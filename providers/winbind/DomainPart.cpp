@@ -32,10 +32,10 @@ void LeaveDirectory(Membership const& membership, Account const* account,
     StagingFolder staging;
     SambaDomain domain = membership.domain;
     domain.preferredControllers.clear(); // the one that answers is named to the tools
-    staging.Configure(domain);
+    staging.Configure(domain, membership.DNSName(), {});
     SambaFolders const folders = SambaFolders::Read(deadline);
     staging.SetSecrets(ReadHostFile(folders.secrets + '/' + Paths::Secrets).value_or(""));
-    SambaTools const tools(staging.Configuration());
+    SambaTools const tools(staging);
     auto const controller = DomainDiscovery::FindController(
         tools, membership.DNSName(), PreferredControllers(Paths::State).Read(), deadline);
     std::string const& computer = membership.domain.netbiosName;

@@ -90,12 +90,13 @@ void RestoreSecrets(SambaFolders const& folders) {
 }
 
 /// What winbindd and `net` know of the domain, and can find out again.
-void RemoveCaches(SambaFolders const& folders) {
+void RemoveCaches(SambaFolders const& folders, std::string const& workgroup) {
     for (std::string const& file :
          {folders.cache + "/winbindd_cache.tdb", folders.state + "/winbindd_cache.tdb",
           folders.cache + "/netsamlogon_cache.tdb", folders.state + "/netsamlogon_cache.tdb",
           folders.cache + "/gencache.tdb", folders.lock + "/gencache.tdb",
-          folders.secrets + "/netlogon_creds_cli.tdb"}) {
+          folders.secrets + "/netlogon_creds_cli.tdb",
+          folders.lock + "/smb_krb5/krb5.conf." + workgroup}) {
         RemoveHostFile(file);
     }
 }
@@ -134,14 +135,15 @@ void RemoveKerberos(bool fileIsMade, bool folderIsMade) {
 }
 
 /// What comes after smb.conf. The own file for Samba goes last: it says what is left to do.
-bool RemoveRest(SambaFolders const& folders, std::set<Made> const& made) {
+bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
+    std::set<Made> const& made = membership.made;
     return RunAll({
                [&] { RestoreSecrets(folders); },
                [&] {
                    RemoveKerberos(made.count(Made::KerberosFile) != 0,
                                   made.count(Made::KerberosFolder) != 0);
                },
-               [&] { RemoveCaches(folders); },
+               [&] { RemoveCaches(folders, membership.domain.workgroup); },
            }) &&
            RunAll({[] { RemoveHostFile(Paths::OwnSamba); }});
 }
@@ -186,8 +188,8 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
 
     (void)changes.MakeFolder(folders.pid, 0755); // lies in /run, and may not be there yet
     // Not before: what is new of the provider's own is taken back by its own steps.
-    FolderSnapshot const snapshot(
-        {folders.state, folders.secrets, folders.cache, folders.lock, folders.pid});
+    FolderSnapshot const snapshot({folders.state, folders.secrets, folders.cache, folders.lock,
+                                   folders.pid, Paths::SambaLogs});
     changes.OnUndo([daemon, snapshot] {
         daemon.Stop(Clock::now() + stopLimit);
         snapshot.RemoveNewFiles();
@@ -211,7 +213,7 @@ void Dissolve(Membership const& membership, Clock::time_point deadline) {
     }
     WinbindDaemon const daemon(folders.pid);
     bool const stopped = RunAll({[&] { daemon.Stop(Clock::now() + stopLimit); }});
-    bool const removed = RemoveRest(folders, membership.made);
+    bool const removed = RemoveRest(folders, membership);
     if (membership.made.count(Made::Daemon) == 0) {
         // It ran before the join. Whether it can serve a host without a domain is its own matter.
         (void)RunAll({[&] { daemon.Restart(Clock::now() + stopLimit); }});

@@ -26,7 +26,7 @@ constexpr std::pair<Membership::Made, char const*> words[] = {
 
 std::set<Membership::Made> ReadRecord(std::string const& text) {
     std::set<Membership::Made> made;
-    std::string::size_type const start = text.rfind(recordStart);
+    std::string::size_type const start = text.find(recordStart);
     if (start == std::string::npos) {
         return made;
     }

@@ -30,7 +30,8 @@ struct Membership {
     /// @throws Failure where a file cannot be read
     static std::optional<Membership> Read();
 
-    /// What is appended to the text of the own file, for `Read`.
+    /// What is put before the text of the own file, for `Read`. Not behind it: its last line may be
+    /// one that nothing can follow.
     static std::string Record(std::set<Made> const& made);
 };
 

@@ -22,7 +22,11 @@ inline constexpr char PreferredControllersKey[] = "preferred-domain-controllers"
 inline constexpr char Secrets[] = "secrets.tdb";
 inline constexpr char SecretsBeforeJoin[] = "tslauth-before-join.tdb";
 
-/// Held by every operation that changes the host.
+/// Where Samba logs, unless its configuration says otherwise.
+inline constexpr char SambaLogs[] = "/var/log/samba";
+
+/// Held by every operation that changes the host. The file stays: a lock whose file goes with its
+/// holder is none for who waits for it.
 inline constexpr char Lock[] = "/run/tslauth-winbind.lock";
 /// A folder of each join and part, with six more characters. Its owner alone can look into it.
 inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";

@@ -439,6 +439,9 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
             section.Add(name, value);
         }
     };
+    // Nobody answers broadcasts for a domain of this kind; waiting for them would only take time.
+    unlessSet("disable netbios", "yes");
+    unlessSet("name resolve order", "host");
     unlessSet("template shell", "/bin/sh");
     unlessSet("template homedir", "/home/%D/%U");
     AddIdmaps(section, domain.workgroup, administrator);
@@ -454,6 +457,8 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
 std::string StagedSambaDomainText(SambaDomain const& domain, std::string const& directory) {
     GlobalSection section("");
     AddMembership(section, domain);
+    section.Add("disable netbios", "yes"); // broadcasts would only take time
+    section.Add("name resolve order", "host");
     section.Add("private dir", directory + "/private");
     section.Add("state directory", directory + "/state");
     section.Add("cache directory", directory + "/cache");

@@ -6,6 +6,7 @@
 #include "Failure.h"
 #include "HostFile.h"
 #include "Paths.h"
+#include "StagingFolder.h"
 #include "ToolFailure.h"
 
 #include <algorithm>
@@ -89,7 +90,9 @@ SambaFolders SambaFolders::Read(Clock::time_point deadline) {
     return folders;
 }
 
-SambaTools::SambaTools(std::string configuration) : _configuration(std::move(configuration)) {}
+SambaTools::SambaTools(StagingFolder const& staging)
+    : _configuration(staging.Configuration()),
+      _kerberosConfiguration(staging.KerberosConfiguration()) {}
 
 ChildProcess::Task SambaTools::Task() const {
     ChildProcess::Task task;
@@ -99,6 +102,10 @@ ChildProcess::Task SambaTools::Task() const {
     }
     // Tickets are the child's alone, and go with it.
     task.environment = {"KRB5CCNAME=MEMORY:tslauth"};
+    if (!_kerberosConfiguration.empty()) {
+        // Without a word in it of where a host belongs, Kerberos asks DNS, domain by domain upwards.
+        task.environment.push_back("KRB5_CONFIG=" + _kerberosConfiguration);
+    }
     return task;
 }
 

@@ -11,6 +11,8 @@
 
 namespace tessel::winbind {
 
+class StagingFolder;
+
 /// The folders in which the Samba of this host keeps its files.
 struct SambaFolders {
     std::string secrets; ///< "private dir"
@@ -32,8 +34,10 @@ struct SambaFolders {
 /// text stands for. A value, for any number of threads.
 class SambaTools {
 public:
-    /// @param configuration path of the smb.conf to use; empty: the host's
-    explicit SambaTools(std::string configuration);
+    /// With the host's configuration.
+    SambaTools() = default;
+
+    explicit SambaTools(StagingFolder const& staging);
 
     /// What a controller says of itself; one datagram each way, and no account.
     ControllerAnswer Lookup(std::string const& controller, Clock::time_point deadline) const;
@@ -65,7 +69,8 @@ public:
 private:
     ChildProcess::Task Task() const;
 
-    std::string _configuration;
+    std::string _configuration; ///< empty: the host's, here and below
+    std::string _kerberosConfiguration;
 };
 
 } // namespace tessel::winbind

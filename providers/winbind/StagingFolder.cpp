@@ -3,6 +3,7 @@
 
 #include "Failure.h"
 #include "HostFile.h"
+#include "KerberosConfiguration.h"
 #include "Paths.h"
 
 #include <cerrno>
@@ -58,8 +59,10 @@ StagingFolder::~StagingFolder() {
     RemoveTree(_path);
 }
 
-void StagingFolder::Configure(SambaDomain const& domain) {
+void StagingFolder::Configure(SambaDomain const& domain, std::string const& dnsName,
+                              std::vector<std::string> const& controllers) {
     Write(Configuration(), StagedSambaDomainText(domain, _path));
+    Write(KerberosConfiguration(), KerberosDomainText({domain.realm, dnsName, controllers}));
 }
 
 std::string StagingFolder::SecretsPath() const {

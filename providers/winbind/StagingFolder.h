@@ -5,6 +5,7 @@
 
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace tessel::winbind {
 
@@ -19,8 +20,10 @@ public:
     StagingFolder& operator=(StagingFolder const&) = delete;
     ~StagingFolder();
 
-    /// The tools' smb.conf. May be called again when more is known of the domain.
-    void Configure(SambaDomain const& domain);
+    /// The tools' smb.conf and krb5.conf. May be called again when more is known of the domain.
+    /// @param controllers the only ones that Kerberos asks; empty: those of DNS
+    void Configure(SambaDomain const& domain, std::string const& dnsName,
+                   std::vector<std::string> const& controllers);
 
     /// Puts the secrets there that the tools start from.
     void SetSecrets(std::string_view database);
@@ -30,6 +33,9 @@ public:
 
     std::string Configuration() const {
         return _path + "/smb.conf";
+    }
+    std::string KerberosConfiguration() const {
+        return _path + "/krb5.conf";
     }
 
     /// Removes the folders of operations that did not end. To be called under the lock alone.

@@ -24,12 +24,14 @@ namespace tessel::winbind {
 
 namespace {
 
-constexpr char program[] = "winbindd";
+constexpr char daemonProgram[] = "winbindd";
+constexpr char helperProgram[] = "samba-dcerpcd";
 constexpr char unit[] = "winbind.service";
 constexpr auto pause = std::chrono::milliseconds(25);
 constexpr auto longPause = std::chrono::milliseconds(250);
 /// What it is given to end by itself.
 constexpr auto politeness = std::chrono::seconds(5);
+constexpr auto helperPatience = std::chrono::seconds(2);
 constexpr auto onePing = std::chrono::seconds(2);
 
 bool SystemdManages() {
@@ -76,7 +78,7 @@ bool WaitForEnd(pid_t process, Clock::time_point deadline) {
 
 WinbindDaemon::WinbindDaemon(std::string pidFolder) : _pidFolder(std::move(pidFolder)) {}
 
-pid_t WinbindDaemon::Process() const {
+pid_t WinbindDaemon::Process(std::string const& program) const {
     std::string const text = ReadHostFile(_pidFolder + '/' + program + ".pid").value_or("");
     auto const process = static_cast<pid_t>(std::strtol(text.c_str(), nullptr, 10));
     if (process <= 1) {
@@ -91,21 +93,26 @@ pid_t WinbindDaemon::Process() const {
 }
 
 bool WinbindDaemon::Runs() const {
-    return Process() != 0;
+    return Process(daemonProgram) != 0;
 }
 
 void WinbindDaemon::StopProcess(Clock::time_point deadline) const {
-    pid_t const process = Process();
+    pid_t const process = Process(daemonProgram);
     if (process == 0) {
         return;
     }
     (void)::kill(process, SIGTERM); // it may have ended by itself; the wait tells
-    if (WaitForEnd(process, std::min(deadline, Clock::now() + politeness))) {
-        return;
+    if (!WaitForEnd(process, std::min(deadline, Clock::now() + politeness))) {
+        (void)::kill(process, SIGKILL); // likewise
+        if (!WaitForEnd(process, Clock::now() + politeness)) {
+            throw Failure(TSLAUTH_PROVIDER_SERVICE_CANNOT_ACCEPT_CONTROL,
+                          "winbindd cannot be stopped");
+        }
     }
-    (void)::kill(process, SIGKILL); // likewise
-    if (!WaitForEnd(process, Clock::now() + politeness)) {
-        throw Failure(TSLAUTH_PROVIDER_SERVICE_CANNOT_ACCEPT_CONTROL, "winbindd cannot be stopped");
+    // What winbindd started for itself ends with it, a little later, unless smbd needs it as well.
+    pid_t const helper = Process(helperProgram);
+    if (helper != 0 && Process("smbd") == 0) {
+        (void)WaitForEnd(helper, Clock::now() + helperPatience); // nothing depends on it
     }
 }
 
@@ -123,8 +130,8 @@ void WinbindDaemon::Restart(Clock::time_point deadline) const {
     } else {
         StopProcess(deadline);
         ChildProcess::Task task;
-        task.arguments = {program, "-D"};
-        RequireSuccess(program, ChildProcess::Run(task, deadline));
+        task.arguments = {daemonProgram, "-D"};
+        RequireSuccess(daemonProgram, ChildProcess::Run(task, deadline));
     }
     for (;;) {
         auto const now = Clock::now();
@@ -143,7 +150,7 @@ void WinbindDaemon::Restart(Clock::time_point deadline) const {
 
 void WinbindDaemon::Reload() const noexcept {
     try {
-        pid_t const process = Process();
+        pid_t const process = Process(daemonProgram);
         if (process != 0) {
             (void)::kill(process, SIGHUP); // where it has just ended, there is nobody to tell
         }

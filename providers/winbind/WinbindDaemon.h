@@ -33,8 +33,8 @@ public:
     static void CheckTrust(Clock::time_point deadline);
 
 private:
-    /// 0 where it does not run.
-    pid_t Process() const;
+    /// The daemon of that name; 0 where it does not run.
+    pid_t Process(std::string const& program) const;
     void StopProcess(Clock::time_point deadline) const;
 
     std::string _pidFolder;
