@@ -24,14 +24,6 @@ namespace tessel::winbind {
 
 namespace {
 
-Membership RequireMembership() {
-    auto membership = Membership::Read();
-    if (!membership) {
-        throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "this host is joined to no domain");
-    }
-    return *membership;
-}
-
 Clock::time_point QuestionDeadline() {
     return Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_QUESTION_SECONDS);
 }
@@ -87,7 +79,11 @@ authentication::Domain GetActiveDomain() {
 
 std::string GetMachineAccountDN() {
     static constexpr char attribute[] = "distinguishedName";
-    std::string const computer = RequireMembership().domain.netbiosName;
+    auto const membership = Membership::Read();
+    if (!membership) {
+        return {};
+    }
+    std::string const& computer = membership->domain.netbiosName;
     auto const entries = SearchDirectory("", "(sAMAccountName=" + EscapedForFilter(computer) + "$)",
                                          {attribute}, QuestionDeadline());
     std::string name = entries.empty() ? std::string() : ValueIn(entries.front(), attribute);

@@ -39,7 +39,8 @@ std::vector<std::string> GetPreferredDomainControllers();
 /// joined to none. Reads one file, and asks nobody.
 authentication::Domain GetActiveDomain();
 
-/// The distinguished name of the host's account, asked of a controller with that account.
+/// The distinguished name of the host's account, asked of a controller with that account; empty
+/// where the host is joined to no domain.
 std::string GetMachineAccountDN();
 
 /// The controllers of `domain` as its DNS lists them, the preferred ones that it lists first.

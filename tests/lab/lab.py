@@ -144,15 +144,17 @@ class Node:
         return found[0] if found else None
 
     def snapshot(self, *folders):
-        """Every file below the folders: name -> (kind, mode, owner, group, target, sum)."""
+        """Every file below the folders: name -> (kind, mode, owner, group, target, sum). What comes
+        or goes meanwhile may lack its sum."""
         listing = self.ok("find", *folders, "-xdev", "-printf", r"%p\t%y %m %U %G %l\n").out
         found = dict(line.split("\t", 1) for line in listing.splitlines())
         sums = self.shell(
-            'find "$@" -xdev -type f -print0 | xargs -0r sha256sum --zero | tr "\\0" "\\n"',
-            *folders).out
+            'find "$@" -xdev -type f -print0 | xargs -0r sha256sum --zero 2>/dev/null |'
+            ' tr "\\0" "\\n"', *folders).out
         for line in sums.splitlines():
             digest, path = line.split("  ", 1)
-            found[path] += " " + digest
+            if path in found:
+                found[path] += " " + digest
         return found
 
 

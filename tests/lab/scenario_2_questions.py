@@ -11,6 +11,8 @@ TITLE = "The domain's answers, and what the controllers say"
 IN_FOREST, TRANSITIVE, INBOUND, OUTBOUND = 1, 2, 4, 8
 HEALTHY, SECRET_REFUSED, NOT_RUNNING, NOT_JOINED = 0, 1, 3, 7
 DOMAINS = ("corp.example", "CORP", "other.example", "OTHER", "nowhere.example")
+# Exit codes of tslauthctl.
+REFUSED, UNREACHABLE, UNJOINED = 4, 8, 10
 NO_SUCH_DOMAIN = "NoSuchDomainException: "
 # Of the directory (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
 WITHIN_FOREST, FOREST_TRANSITIVE = 0x20, 0x8
@@ -70,7 +72,7 @@ def before_the_join(lab, host):
     with lab.step(f"not joined: the trust state is {NOT_JOINED}"):
         expect_equal(state(host), NOT_JOINED, "the trust state")
     with lab.step("not joined: tslauthctl info says so with exit code 10"):
-        document = info(host, 10)
+        document = info(host, UNJOINED)
         expect_equal((document["joined"], document["trust_state"]), (False, NOT_JOINED), "joined")
 
 
@@ -117,7 +119,7 @@ def controllers(lab, host, about):
     with lab.step("nowhere.example has none: there is no such domain"):
         expect(about["nowhere.example"]["dc"].startswith(NO_SUCH_DOMAIN),
                about["nowhere.example"]["dc"])
-        host.exits(4, "tslauthctl", "dc", "nowhere.example")
+        host.exits(UNREACHABLE, "tslauthctl", "dc", "nowhere.example")
 
 
 def relationships(lab, about):
@@ -179,15 +181,16 @@ def canonical(lab, host):
             expect(found["canonicalName"][0] == names[0], str(found))
             expect_equal(host.ok("wbinfo", "--name-to-sid", expected).out.split()[0],
                          found["objectSid"][0], "the host's and the controller's")
-    for name, exception in (("CORP\\nobody", "NoSuchUserException"),
-                            ("corp.example/Users/nobody", "NoSuchUserException"),
-                            ("corp.example/Servers/user1", "NoSuchUserException"),
-                            ("user1@nowhere.example", "NoSuchDomainException"),
-                            ("user1", "InvalidAccountNameException")):
+    for name, exception, code in (
+            ("CORP\\nobody", "NoSuchUserException", REFUSED),
+            ("corp.example/Users/nobody", "NoSuchUserException", REFUSED),
+            ("corp.example/Servers/user1", "NoSuchUserException", REFUSED),
+            ("user1@nowhere.example", "NoSuchDomainException", UNREACHABLE),
+            ("user1", "InvalidAccountNameException", REFUSED)):
         with lab.step(f"{name} is refused with {exception}"):
             asked = host.library("canonical", name).out
             expect(asked.startswith(f"{name}={exception}: Exception 0x"), asked)
-            host.exits(4, "tslauthctl", "canonical", name)
+            host.exits(code, "tslauthctl", "canonical", name)
 
 
 def stop_winbindd(host):
@@ -237,10 +240,11 @@ def trust_states(lab, host):
         expect(about["corp.example"]["dc"].startswith("ServiceNotActiveException: "),
                about["corp.example"]["dc"])
     with lab.step("tslauthctl info says the same, and that it is not complete"):
-        document = info(host, 4)
+        document = info(host, REFUSED)
         expect_equal(document["trust_state"], NOT_RUNNING, "the trust state")
-        expect_equal([failure["exception"] for failure in document["failures"]],
-                     ["ServiceNotActiveException"], "the failures")
+        expect_equal([(failure["of"], failure["exception"].rpartition(":")[2])
+                      for failure in document["failures"]],
+                     [("trusted_domains", "ServiceNotActiveException")], "the failures")
     with lab.step(f"winbindd is started: the trust state is {HEALTHY}"):
         start_winbindd(host)
         until("the trust is healthy", lambda: state(host) == HEALTHY)

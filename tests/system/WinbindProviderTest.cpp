@@ -105,7 +105,7 @@ TEST_F(WinbindProviderTest, AHostThatIsNotJoinedHasNoDomain) {
     EXPECT_EQ(7, provider.GetDomainTrustState());
     EXPECT_EQ(0, provider.GetDomainTrustRelationship("corp.example"));
     EXPECT_THROW(provider.GetHostPrincipalForDomain("corp.example"), NoSuchDomainException);
-    EXPECT_THROW(provider.GetMachineAccountDN(), NoSuchDomainException);
+    EXPECT_EQ("", provider.GetMachineAccountDN());
     EXPECT_THROW(provider.ConvertCanonicalUsername("CORP\\user1"), NoSuchDomainException);
     EXPECT_THROW(provider.ConvertCanonicalUsername("user1"), InvalidAccountNameException);
     // The node has no network.
