@@ -12,6 +12,7 @@
 #include <mutex>
 #include <new>
 #include <pthread.h>
+#include <utility>
 
 namespace tessel::winbind {
 
@@ -46,9 +47,13 @@ extern "C" void UnlockThreads() {
     AllThreads().lock.unlock();
 }
 
-/// In a child, which has none of its parent's threads, and whose lock is in the parent's state.
+/// In a child, which has none of its parent's threads, and where this one holds the lock.
 extern "C" void ForgetThreads() {
-    new (&AllThreads()) Threads;
+    Threads& threads = AllThreads();
+    threads.running = 0;
+    threads.abandoned = 0;
+    new (&threads.changed) std::condition_variable; // nobody waits for the old one any more
+    threads.lock.unlock();
 }
 
 /// One call, owned by its caller and by its thread.
@@ -147,8 +152,11 @@ void BoundedCall::Wait(std::string const& what, Clock::time_point deadline,
         threads.changed.notify_all();
         throw TimedOut(what);
     }
-    if (call->failure) {
-        std::rethrow_exception(call->failure);
+    // Its only owner from now on: the thread may still be about to let go of the call.
+    std::exception_ptr const failure = std::exchange(call->failure, nullptr);
+    lock.unlock();
+    if (failure) {
+        std::rethrow_exception(failure);
     }
 }
 

@@ -14,6 +14,24 @@ bool nss_wrapper_enabled() {
     return true;
 }
 
+#if defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
+// libwbclient believes the length that an answer states, and does not release all of a bad answer.
+extern "C" char const* __asan_default_options();
+extern "C" char const* __asan_default_options() {
+    return "allocator_may_return_null=1";
+}
+extern "C" char const* __tsan_default_options();
+extern "C" char const* __tsan_default_options() {
+    return "allocator_may_return_null=1";
+}
+extern "C" char const* __lsan_default_suppressions();
+extern "C" char const* __lsan_default_suppressions() {
+    return "leak:libwbclient.so";
+}
+#endif
+#endif
+
 namespace {
 
 WinbindClient ClientFor(BoundedCall::Clock::duration time) {
