@@ -3,6 +3,7 @@
 
 #include "ChildProcess.h"
 #include "Failure.h"
+#include "StagingFolder.h"
 #include "TextPieces.h"
 #include "ToolFailure.h"
 
@@ -42,7 +43,11 @@ std::vector<DirectoryEntry> SearchDirectory(std::string const& controller,
                                             std::string const& filter,
                                             std::vector<std::string> const& attributes,
                                             BoundedCall::Clock::time_point deadline) {
-    ChildProcess::Task task{{"net", "ads", "search", "--machine-pass"}};
+    // What `net` remembers is its own: in the lock folder of the host, winbindd and every later `net`
+    // would go on for a minute without a controller that has not answered once.
+    StagingFolder const scratch;
+    ChildProcess::Task task{
+        {"net", "ads", "search", "--machine-pass", "--option=lock directory=" + scratch.Memory()}};
     if (!controller.empty()) {
         task.arguments.insert(task.arguments.end(), {"-S", controller});
     }

@@ -73,6 +73,10 @@ void StagingFolder::SetSecrets(std::string_view database) {
     Write(SecretsPath(), database);
 }
 
+std::string StagingFolder::Memory() const {
+    return _path + "/lock";
+}
+
 std::string StagingFolder::Secrets() const {
     return ReadHostFile(SecretsPath()).value_or("");
 }

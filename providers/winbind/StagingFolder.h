@@ -31,6 +31,9 @@ public:
     /// The secrets as the tools left them; empty where they made none.
     std::string Secrets() const;
 
+    /// Where tools that work with the host's own configuration can keep what they remember.
+    std::string Memory() const;
+
     std::string Configuration() const {
         return _path + "/smb.conf";
     }
