@@ -64,7 +64,7 @@ void SetPreferredDomainControllers(std::vector<std::string> const& controllers) 
         file.Write(before); // both files or none
         throw;
     }
-    WinbindDaemon(SambaFolders::Read(QuestionDeadline()).pid).Reload();
+    WinbindDaemon(SambaFolders::Read(QuestionDeadline())).Reload();
 }
 
 std::vector<std::string> GetPreferredDomainControllers() {

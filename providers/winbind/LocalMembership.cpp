@@ -153,7 +153,7 @@ bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
 void Establish(Domain const& domain, std::string const& secrets, HostChanges& changes,
                Clock::time_point deadline) {
     SambaFolders const folders = SambaFolders::Read(deadline);
-    WinbindDaemon const daemon(folders.pid);
+    WinbindDaemon const daemon(folders);
     bool const daemonRan = daemon.Runs();
     std::set<Made> made;
     if (daemonRan) {
@@ -211,7 +211,7 @@ void Dissolve(Membership const& membership, Clock::time_point deadline) {
         }
         changes.Keep();
     }
-    WinbindDaemon const daemon(folders.pid);
+    WinbindDaemon const daemon(folders);
     bool const stopped = RunAll({[&] { daemon.Stop(Clock::now() + stopLimit); }});
     bool const removed = RemoveRest(folders, membership);
     if (membership.made.count(Made::Daemon) == 0) {

@@ -4,6 +4,7 @@
 #include "Failure.h"
 #include "HostFile.h"
 #include "Paths.h"
+#include "SambaTools.h"
 #include "SystemLog.h"
 #include "ToolFailure.h"
 #include "WinbindClient.h"
@@ -14,7 +15,8 @@
 #include <climits>
 #include <csignal>
 #include <cstdlib>
-#include <string_view>
+#include <filesystem>
+#include <system_error>
 #include <thread>
 #include <unistd.h>
 #include <utility>
@@ -25,7 +27,9 @@ namespace tessel::winbind {
 namespace {
 
 constexpr char daemonProgram[] = "winbindd";
+/// Answers for winbindd and smbd, with a server for each matter.
 constexpr char helperProgram[] = "samba-dcerpcd";
+constexpr char serverPrefix[] = "rpcd_";
 constexpr char unit[] = "winbind.service";
 constexpr auto pause = std::chrono::milliseconds(25);
 constexpr auto longPause = std::chrono::milliseconds(250);
@@ -56,12 +60,21 @@ void RequireSuccess(std::string const& what, ChildProcess::Outcome const& outcom
     }
 }
 
-/// The file that a process executes; empty where there is no such process.
-std::string ExecutableOf(pid_t process) {
-    std::array<char, PATH_MAX> path = {};
-    ssize_t const length =
-        ::readlink(("/proc/" + std::to_string(process) + "/exe").c_str(), path.data(), path.size());
-    return length > 0 ? std::string(path.data(), static_cast<std::size_t>(length)) : std::string();
+/// The name of the program that a process executes; empty where there is no such process.
+std::string ProgramOf(pid_t process) {
+    std::array<char, PATH_MAX> buffer = {};
+    ssize_t const length = ::readlink(("/proc/" + std::to_string(process) + "/exe").c_str(),
+                                      buffer.data(), buffer.size());
+    if (length <= 0) {
+        return {};
+    }
+    std::string const path(buffer.data(), static_cast<std::size_t>(length));
+    std::string const name = path.substr(path.rfind('/') + 1);
+    return name.substr(0, name.find(' ')); // a program that was replaced has a word behind its path
+}
+
+bool StartsWith(std::string const& text, std::string const& start) {
+    return text.compare(0, start.size(), start) == 0;
 }
 
 bool WaitForEnd(pid_t process, Clock::time_point deadline) {
@@ -76,7 +89,8 @@ bool WaitForEnd(pid_t process, Clock::time_point deadline) {
 
 } // namespace
 
-WinbindDaemon::WinbindDaemon(std::string pidFolder) : _pidFolder(std::move(pidFolder)) {}
+WinbindDaemon::WinbindDaemon(SambaFolders const& folders)
+    : _pidFolder(folders.pid), _messagingFolder(folders.lock + "/msg.lock") {}
 
 pid_t WinbindDaemon::Process(std::string const& program) const {
     std::string const text = ReadHostFile(_pidFolder + '/' + program + ".pid").value_or("");
@@ -84,21 +98,49 @@ pid_t WinbindDaemon::Process(std::string const& program) const {
     if (process <= 1) {
         return 0;
     }
-    // The file may be older than the system's start, and the number somebody else's by now. A
-    // program that was replaced since it was started has a word behind its path.
-    std::string const path = ExecutableOf(process);
-    std::string_view name = std::string_view(path).substr(path.rfind('/') + 1);
-    name = name.substr(0, name.find(' '));
-    return name == program ? process : 0;
+    // The file may be older than the system's start, and the number somebody else's by now.
+    return ProgramOf(process) == program ? process : 0;
 }
 
 bool WinbindDaemon::Runs() const {
     return Process(daemonProgram) != 0;
 }
 
+std::vector<pid_t> WinbindDaemon::Companions() const {
+    bool const withServers = Process("smbd") == 0;
+    std::vector<pid_t> found;
+    std::error_code error;
+    for (std::filesystem::directory_iterator entry(_messagingFolder, error), end;
+         !error && entry != end; entry.increment(error)) {
+        auto const process =
+            static_cast<pid_t>(std::strtol(entry->path().filename().c_str(), nullptr, 10));
+        std::string const name = process > 1 ? ProgramOf(process) : std::string();
+        if (name == daemonProgram ||
+            (withServers && (name == helperProgram || StartsWith(name, serverPrefix)))) {
+            found.push_back(process);
+        }
+    }
+    return found;
+}
+
+/// They end by themselves, a little after winbindd, and write files on the way.
+void WinbindDaemon::StopCompanions() const {
+    for (int const signal : {SIGTERM, SIGKILL}) {
+        auto const companions = Companions();
+        for (pid_t const process : companions) {
+            (void)::kill(process, signal); // it may have ended meanwhile
+        }
+        auto const patience = Clock::now() + helperPatience;
+        for (pid_t const process : companions) {
+            (void)WaitForEnd(process, patience); // who stays is met with the next signal
+        }
+    }
+}
+
 void WinbindDaemon::StopProcess(Clock::time_point deadline) const {
     pid_t const process = Process(daemonProgram);
     if (process == 0) {
+        StopCompanions();
         return;
     }
     (void)::kill(process, SIGTERM); // it may have ended by itself; the wait tells
@@ -109,11 +151,7 @@ void WinbindDaemon::StopProcess(Clock::time_point deadline) const {
                           "winbindd cannot be stopped");
         }
     }
-    // What winbindd started for itself ends with it, a little later, unless smbd needs it as well.
-    pid_t const helper = Process(helperProgram);
-    if (helper != 0 && Process("smbd") == 0) {
-        (void)WaitForEnd(helper, Clock::now() + helperPatience); // nothing depends on it
-    }
+    StopCompanions();
 }
 
 void WinbindDaemon::Stop(Clock::time_point deadline) const {

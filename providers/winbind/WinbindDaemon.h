@@ -5,14 +5,16 @@
 
 #include <string>
 #include <sys/types.h>
+#include <vector>
 
 namespace tessel::winbind {
+
+struct SambaFolders;
 
 /// The host's winbindd: a unit of systemd where that runs, otherwise a daemon of its own.
 class WinbindDaemon {
 public:
-    /// @param pidFolder where it writes the number of its process
-    explicit WinbindDaemon(std::string pidFolder);
+    explicit WinbindDaemon(SambaFolders const& folders);
 
     bool Runs() const;
 
@@ -20,7 +22,8 @@ public:
     /// @throws Failure 1060 where it is not installed, 1062 where it does not answer by `deadline`
     void Restart(Clock::time_point deadline) const;
 
-    /// Returns when it has ended; where it does not run, at once.
+    /// Returns when it has ended, with all that it has started and smbd does not use; where it does
+    /// not run, at once.
     /// @throws Failure
     void Stop(Clock::time_point deadline) const;
 
@@ -37,7 +40,13 @@ private:
     pid_t Process(std::string const& program) const;
     void StopProcess(Clock::time_point deadline) const;
 
+    /// Those of Samba's processes that came with winbindd.
+    std::vector<pid_t> Companions() const;
+    void StopCompanions() const;
+
     std::string _pidFolder;
+    std::string
+        _messagingFolder; ///< each of Samba's processes has a file there, named by its number
 };
 
 } // namespace tessel::winbind
