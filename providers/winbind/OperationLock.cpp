@@ -9,20 +9,36 @@
 #include <fcntl.h>
 #include <string>
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <thread>
 #include <unistd.h>
 
 namespace tessel::winbind {
 
-OperationLock::OperationLock(Clock::time_point deadline)
-    : _descriptor(::open(Paths::Lock, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600)) {
-    if (_descriptor < 0) {
-        ThrowSystemFailure("cannot open '" + std::string(Paths::Lock) + "'", errno);
-    }
-    // Each opening of the file is a holder of its own, so that threads exclude each other as well.
-    while (::flock(_descriptor, LOCK_EX | LOCK_NB) != 0) {
+namespace {
+
+/// Whether the file that is locked is the one that the next comer finds: who had it before has
+/// removed it with its name.
+bool IsInPlace(int descriptor) {
+    struct stat locked = {};
+    struct stat found = {};
+    return ::fstat(descriptor, &locked) == 0 && ::lstat(Paths::Lock, &found) == 0 &&
+           locked.st_dev == found.st_dev && locked.st_ino == found.st_ino;
+}
+
+} // namespace
+
+OperationLock::OperationLock(Clock::time_point deadline) : _descriptor(-1) {
+    for (;;) {
+        _descriptor = ::open(Paths::Lock, O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+        if (_descriptor < 0) {
+            ThrowSystemFailure("cannot open '" + std::string(Paths::Lock) + "'", errno);
+        }
+        if (::flock(_descriptor, LOCK_EX | LOCK_NB) == 0 && IsInPlace(_descriptor)) {
+            return;
+        }
+        (void)::close(_descriptor); // nothing was written to it
         if (Clock::now() >= deadline) {
-            (void)::close(_descriptor); // nothing was written to it
             throw Failure(TSLAUTH_PROVIDER_TIMED_OUT,
                           "another operation holds '" + std::string(Paths::Lock) + "'");
         }
@@ -31,7 +47,9 @@ OperationLock::OperationLock(Clock::time_point deadline)
 }
 
 OperationLock::~OperationLock() {
-    // By hand, because a child that the host has made elsewhere may hold the descriptor as well.
+    // The name goes first, so that who opens it from here on gets a new file. The lock is let go of
+    // by hand, because a child that the host has made elsewhere may hold the descriptor as well.
+    (void)::unlink(Paths::Lock);
     (void)::flock(_descriptor, LOCK_UN);
     (void)::close(_descriptor);
 }

@@ -6,7 +6,7 @@
 namespace tessel::winbind {
 
 /// Keeps what changes the host apart: among the threads of a process, and among processes. Released
-/// by the destructor, and by the end of the process.
+/// by the destructor, and by the end of the process; nothing of it stays in the file system.
 class OperationLock {
 public:
     /// Waits its turn.

@@ -25,8 +25,7 @@ inline constexpr char SecretsBeforeJoin[] = "tslauth-before-join.tdb";
 /// Where Samba logs, unless its configuration says otherwise.
 inline constexpr char SambaLogs[] = "/var/log/samba";
 
-/// Held by every operation that changes the host. The file stays: a lock whose file goes with its
-/// holder is none for who waits for it.
+/// Held by every operation that changes the host; goes with its holder.
 inline constexpr char Lock[] = "/run/tslauth-winbind.lock";
 /// A folder of each join and part, with six more characters. Its owner alone can look into it.
 inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";
