@@ -18,8 +18,6 @@ JOIN = {
     "/etc/krb5.conf": "new",
     "/etc/krb5.conf.d": "new",
     "/etc/krb5.conf.d/tslauth.conf": "new",
-    "/run/samba/winbindd.pid": "new",
-    "/run/samba/gencache.tdb": "new",
     "/var/lib/samba/private/secrets.tdb": "new",
     "/var/lib/samba/private/tslauth-before-join.tdb": "new",
     "/var/lib/samba/private/netlogon_creds_cli.tdb": "new",
