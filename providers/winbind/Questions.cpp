@@ -64,23 +64,85 @@ Domain JoinedOrThrow() {
     throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "this host is joined to no domain");
 }
 
-/// The other domains that winbindd knows.
+/// The numbers of a trusted domain object (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
+enum TrustDirection : unsigned long { Inbound = 0x1, Outbound = 0x2 };
+enum TrustAttributes : unsigned long {
+    NonTransitive = 0x1,
+    ForestTransitive = 0x8,
+    WithinForest = 0x20
+};
+
+/// The bits of a trust that the host's domain itself has.
+int DirectRelationship(DirectoryEntry const& trust) {
+    auto const number = [&](char const* attribute) {
+        // The directory writes 32 bits as a signed number.
+        return static_cast<unsigned long>(
+            std::strtol(ValueIn(trust, attribute).c_str(), nullptr, 10));
+    };
+    unsigned long const attributes = number("trustAttributes");
+    unsigned long const direction = number("trustDirection");
+    int bits = 0;
+    if ((attributes & WithinForest) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_IN_FOREST;
+    }
+    if ((attributes & (WithinForest | ForestTransitive)) != 0 &&
+        (attributes & NonTransitive) == 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_TRANSITIVE;
+    }
+    if ((direction & Inbound) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_INBOUND;
+    }
+    if ((direction & Outbound) != 0) {
+        bits |= TSLAUTH_WINBIND_TRUST_OUTBOUND;
+    }
+    return bits;
+}
+
+/// Whether `domain` is one of `domains`.
+bool Contains(std::vector<Domain> const& domains, Domain const& domain) {
+    return std::any_of(domains.begin(), domains.end(), [&](Domain const& other) {
+        return Names(domain.NetBIOSName(), other) || Names(domain.DNSName(), other);
+    });
+}
+
+/// The other domains that winbindd remembers: those whose users it has met.
 std::vector<Domain> OtherDomains(WinbindClient const& client, Domain const& own) {
     std::vector<Domain> others;
     for (WinbindClient::Domain const& domain : client.ListDomains()) {
         // This machine's own accounts, the built-in groups among them.
         bool const isLocal = domain.trustType == WBC_DOMINFO_TRUSTTYPE_LOCAL;
-        if (!isLocal && !Names(domain.names.NetBIOSName(), own) &&
-            !Names(domain.names.DNSName(), own)) {
+        if (!isLocal && !Contains({own}, domain.names)) {
             others.push_back(domain.names);
         }
     }
     return others;
 }
 
-/// The domain that `name` means, the host's own or another that winbindd knows.
-std::optional<Domain> FindDomain(WinbindClient const& client, Domain const& own,
-                                 std::string const& name) {
+/// The trusts of the host's domain, all or those to the domain `name`.
+std::vector<DirectoryEntry> FindTrusts(std::string const& name, Clock::time_point deadline) {
+    std::string filter = "(objectClass=trustedDomain)";
+    if (!name.empty()) {
+        std::string const escaped = EscapedForFilter(name);
+        filter = "(&" + filter + "(|(trustPartner=" + escaped + ")(flatName=" + escaped + ")))";
+    }
+    return SearchDirectory(
+        "", filter, {"trustPartner", "flatName", "trustDirection", "trustAttributes"}, deadline);
+}
+
+/// The domains of trusts whose users may log in here.
+std::vector<Domain> DomainsOf(std::vector<DirectoryEntry> const& trusts) {
+    std::vector<Domain> domains;
+    for (DirectoryEntry const& trust : trusts) {
+        if ((DirectRelationship(trust) & TSLAUTH_WINBIND_TRUST_OUTBOUND) != 0) {
+            domains.emplace_back(ValueIn(trust, "trustPartner"), ValueIn(trust, "flatName"));
+        }
+    }
+    return domains;
+}
+
+/// The domain that `name` means, the host's own or another that winbindd remembers.
+std::optional<Domain> FindRemembered(WinbindClient const& client, Domain const& own,
+                                     std::string const& name) {
     if (Names(name, own)) {
         return own;
     }
@@ -92,8 +154,19 @@ std::optional<Domain> FindDomain(WinbindClient const& client, Domain const& own,
     return std::nullopt;
 }
 
-Domain FindDomainOrThrow(WinbindClient const& client, Domain const& own, std::string const& name) {
-    if (std::optional<Domain> const domain = FindDomain(client, own, name)) {
+/// The domain that `name` means, the host's own or one that it trusts.
+std::optional<Domain> FindDomain(WinbindClient const& client, Domain const& own,
+                                 std::string const& name, Clock::time_point deadline) {
+    if (auto remembered = FindRemembered(client, own, name)) {
+        return remembered;
+    }
+    std::vector<Domain> const trusted = DomainsOf(FindTrusts(name, deadline));
+    return trusted.empty() ? std::nullopt : std::optional<Domain>(trusted.front());
+}
+
+Domain FindDomainOrThrow(WinbindClient const& client, Domain const& own, std::string const& name,
+                         Clock::time_point deadline) {
+    if (std::optional<Domain> const domain = FindDomain(client, own, name, deadline)) {
         return *domain;
     }
     throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
@@ -131,8 +204,8 @@ std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& ow
 /// it an account's name: a controller knows both by the user's own attribute. Only where it does not,
 /// they are taken as they look.
 std::string UserOfPrincipal(WinbindClient const& client, Domain const& own, UserName const& user,
-                            std::string const& text) {
-    std::optional<Domain> const domain = FindDomain(client, own, user.domain);
+                            std::string const& text, Clock::time_point deadline) {
+    std::optional<Domain> const domain = FindRemembered(client, own, user.domain);
     try {
         return client.GetUserName((domain ? *domain : own).NetBIOSName(), text);
     } catch (Failure const& failure) {
@@ -140,7 +213,8 @@ std::string UserOfPrincipal(WinbindClient const& client, Domain const& own, User
             throw;
         }
     }
-    return client.GetUserName(FindDomainOrThrow(client, own, user.domain).NetBIOSName(), user.name);
+    return client.GetUserName(FindDomainOrThrow(client, own, user.domain, deadline).NetBIOSName(),
+                              user.name);
 }
 
 /// This host's full name, as the join has registered it: what the resolver says of the machine's
@@ -160,40 +234,6 @@ std::string FullHostName(std::string const& machine, Domain const& own,
             return list->ai_canonname == nullptr ? "" : list->ai_canonname;
         });
     return Lower(found.find('.') == std::string::npos ? machine + "." + own.DNSName() : found);
-}
-
-/// The numbers of a trusted domain object (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
-enum TrustDirection : unsigned long { Inbound = 0x1, Outbound = 0x2 };
-enum TrustAttributes : unsigned long {
-    NonTransitive = 0x1,
-    ForestTransitive = 0x8,
-    WithinForest = 0x20
-};
-
-/// The bits of a trust that the host's domain itself has.
-int DirectRelationship(DirectoryEntry const& trust) {
-    auto const number = [&](char const* attribute) {
-        // The directory writes 32 bits as a signed number.
-        return static_cast<unsigned long>(
-            std::strtol(ValueIn(trust, attribute).c_str(), nullptr, 10));
-    };
-    unsigned long const attributes = number("trustAttributes");
-    unsigned long const direction = number("trustDirection");
-    int bits = 0;
-    if ((attributes & WithinForest) != 0) {
-        bits |= TSLAUTH_WINBIND_TRUST_IN_FOREST;
-    }
-    if ((attributes & (WithinForest | ForestTransitive)) != 0 &&
-        (attributes & NonTransitive) == 0) {
-        bits |= TSLAUTH_WINBIND_TRUST_TRANSITIVE;
-    }
-    if ((direction & Inbound) != 0) {
-        bits |= TSLAUTH_WINBIND_TRUST_INBOUND;
-    }
-    if ((direction & Outbound) != 0) {
-        bits |= TSLAUTH_WINBIND_TRUST_OUTBOUND;
-    }
-    return bits;
 }
 
 } // namespace
@@ -251,8 +291,20 @@ int GetDomainTrustState() {
 }
 
 std::vector<Domain> GetTrustedDomains() {
+    Clock::time_point const deadline = Deadline();
     std::optional<Domain> const own = Joined();
-    return own ? OtherDomains(WinbindClient(Deadline()), *own) : std::vector<Domain>();
+    if (!own) {
+        return {};
+    }
+    // A domain behind another one is nobody's trust in the directory, and known once it was met.
+    std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
+    std::vector<Domain> domains = DomainsOf(FindTrusts("", deadline));
+    for (Domain const& domain : remembered) {
+        if (!Contains(domains, domain)) {
+            domains.push_back(domain);
+        }
+    }
+    return domains;
 }
 
 std::string GetAnyDomainController(std::string const& site, std::string const& domain) {
@@ -267,14 +319,16 @@ std::string GetAnyDomainController(std::string const& site, std::string const& d
         return found.front();
     }
     WinbindClient const client(deadline);
-    std::optional<Domain> const known = FindDomain(client, *own, domain);
+    bool const hasDNSName = domain.find('.') != std::string::npos;
+    auto const find = [&] { return FindDomain(client, *own, domain, deadline); };
+    std::optional<Domain> const known = hasDNSName ? FindRemembered(client, *own, domain) : find();
     try {
         // By its DNS name, where it has one: that is the name that sites and DNS know.
         return client.FindDomainController(
             known && !known->DNSName().empty() ? known->DNSName() : DomainName(domain), site);
     } catch (Failure const& failure) {
         // winbindd has one answer for a domain that it cannot find and for one that is silent.
-        if (known && failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_DOMAIN) {
+        if (failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_DOMAIN && (known || find())) {
             throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS, failure.what());
         }
         throw;
@@ -288,24 +342,26 @@ std::string ConvertCanonicalUsername(std::string const& name) {
     WinbindClient const client(deadline);
     switch (user.form) {
     case UserName::Form::canonical: {
-        Domain const domain = FindDomainOrThrow(client, own, user.domain);
+        Domain const domain = FindDomainOrThrow(client, own, user.domain, deadline);
         return client.GetUserName(
             domain.NetBIOSName(),
             AccountOfCanonicalName(client, own, domain, name, user.name, deadline));
     }
     case UserName::Form::principal:
-        return UserOfPrincipal(client, own, user, name);
+        return UserOfPrincipal(client, own, user, name, deadline);
     case UserName::Form::downLevel:
         break;
     }
-    return client.GetUserName(FindDomainOrThrow(client, own, user.domain).NetBIOSName(), user.name);
+    return client.GetUserName(FindDomainOrThrow(client, own, user.domain, deadline).NetBIOSName(),
+                              user.name);
 }
 
 std::string GetHostPrincipalForDomain(std::string const& domain) {
     Clock::time_point const deadline = Deadline();
     Domain const own = JoinedOrThrow();
     WinbindClient const client(deadline);
-    (void)FindDomainOrThrow(client, own, domain); // the principal is the same for all of them
+    (void)FindDomainOrThrow(client, own, domain,
+                            deadline); // the principal is the same for all of them
     return "host/" + FullHostName(Lower(client.GetHost().netBIOSName), own, deadline) + "@" +
            Upper(own.DNSName());
 }
@@ -321,15 +377,12 @@ int GetDomainTrustRelationship(std::string const& domain) {
                TSLAUTH_WINBIND_TRUST_INBOUND | TSLAUTH_WINBIND_TRUST_OUTBOUND;
     }
     // winbindd, on a member, knows neither direction nor kind.
-    std::string const name = EscapedForFilter(DomainName(domain));
-    std::vector<DirectoryEntry> const trusts = SearchDirectory(
-        "", "(&(objectClass=trustedDomain)(|(trustPartner=" + name + ")(flatName=" + name + ")))",
-        {"trustDirection", "trustAttributes"}, deadline);
+    std::vector<DirectoryEntry> const trusts = FindTrusts(domain, deadline);
     if (!trusts.empty()) {
         return DirectRelationship(trusts.front());
     }
     WinbindClient const client(deadline);
-    std::optional<Domain> const found = FindDomain(client, *own, domain);
+    std::optional<Domain> const found = FindRemembered(client, *own, domain);
     if (!found) {
         return 0;
     }

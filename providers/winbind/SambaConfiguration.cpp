@@ -429,7 +429,10 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
     AddMembership(section, domain);
     // A controller that does not answer must not hold up questions for winbindd's whole minute.
     section.Add("winbind request timeout", "5");
-    section.Add("winbind scan trusted domains", "yes");
+    // It works without: winbindd meets a trusted domain when it is asked for one of its users. With
+    // it, all of winbindd waits while it looks for the controllers of those domains, which may be
+    // silent, and everybody's log-in waits with it, root's too.
+    section.Add("winbind scan trusted domains", "no");
     // Names are DOMAIN\name everywhere, so that no user of the domain is taken for a local one.
     section.Add("winbind use default domain", "no");
     section.Text() += '\n';

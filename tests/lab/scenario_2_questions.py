@@ -18,9 +18,9 @@ NO_SUCH_DOMAIN = "NoSuchDomainException: "
 WITHIN_FOREST, FOREST_TRANSITIVE = 0x20, 0x8
 
 
-def ask(host):
-    """What the library tells: name -> text, and domain -> (name -> text)."""
-    result = host.library("ask", *DOMAINS)
+def ask(host, *domains):
+    """What the library tells: name -> text, and for the domains, domain -> (name -> text)."""
+    result = host.library("ask", *domains)
     expect_equal(result.code, 0, f"the exit code of\n{result}\n")
     answers, about = {"preferred": []}, {}
     current = answers
@@ -65,10 +65,14 @@ def trusts_of(node):
 
 def before_the_join(lab, host):
     with lab.step("not joined: the library knows no domain, no account and no trusted domain"):
-        answers, about = ask(host)
+        answers, about = ask(host, "corp.example")
         expect_equal(answers["domain"], "DNS Name: (unset), NetBIOS Name: (unset)", "the domain")
         expect_equal((answers["dn"], answers["trusted"]), ("", ""), "account and trusted domains")
         expect_equal(about["corp.example"]["relationship"], "0", "the relationship")
+        expect(about["corp.example"]["principal"].startswith(NO_SUCH_DOMAIN),
+               about["corp.example"]["principal"])
+    with lab.step("not joined: DNS names a controller of corp.example all the same"):
+        expect_equal(about["corp.example"]["dc"], "dc1.corp.example", "the library's answer")
     with lab.step(f"not joined: the trust state is {NOT_JOINED}"):
         expect_equal(state(host), NOT_JOINED, "the trust state")
     with lab.step("not joined: tslauthctl info says so with exit code 10"):
@@ -80,7 +84,7 @@ def own_domain(lab, host):
     listing = lab.dc1.samba_tool("domain", "info", "127.0.0.1").out
     own = dict(re.findall(r"^(.*\S)\s*: (.*)$", listing, re.MULTILINE))
     account = lab.dc1.account_of(host)
-    answers, about = ask(host)
+    answers, about = ask(host, *DOMAINS)
     document = info(host)
     with lab.step(f"the domain is {own['Domain']} ({own['Netbios domain']}), as samba-tool says"):
         expect_equal(answers["domain"], f"DNS Name: {own['Domain']}, "
@@ -232,7 +236,7 @@ def preferred(lab, host):
 def trust_states(lab, host):
     with lab.step(f"winbindd is stopped: the trust state is {NOT_RUNNING}"):
         stop_winbindd(host)
-        answers, about = ask(host)
+        answers, about = ask(host, "corp.example")
         expect_equal(int(answers["state"]), NOT_RUNNING, "the trust state")
         expect(answers["trusted"].startswith("ServiceNotActiveException: Exception 0x00000426: "),
                answers["trusted"])

@@ -1,8 +1,9 @@
 # SPDX-License-Identifier: Apache-2.0
 """Hosts part and go back to local users, and every file is compared with what it was."""
+import os
 import re
 
-from lab import LOCAL_PASSWORD, LogIn, PASSWORD, at_once, differences, expect, expect_equal
+from lab import LOCAL_PASSWORD, LogIn, PASSWORD, TREE, at_once, differences, expect, expect_equal
 
 TITLE = "Parting, going back to \"None\", and what is left"
 
@@ -11,7 +12,7 @@ TITLE = "Parting, going back to \"None\", and what is left"
 FOLDERS = ("/etc", "/run", "/home", "/var/lib/samba", "/var/cache/samba", "/var/log/samba")
 
 # What differs from the original, by stage; a pattern stands for at least one path, and every path
-# has to have its pattern. What stays after a part is also what the provider's README.md says.
+# has to have its pattern.
 JOIN = {
     "/etc/samba/smb.conf": "changed",
     "/etc/samba/tslauth.conf": "new",
@@ -31,10 +32,11 @@ ACTIVATION = {
 }
 # The entry of the management address stays in /etc/hosts, and the policy keeps the form in which the
 # library writes it.
-KEPT_BY_THE_LIBRARY = {
+KEPT_BY_US = {
     "/etc/hosts": "changed",
     "/etc/pam.d/system-auth-generic": "changed",
     "/run/tslauthctl.lock": "new",
+    "/run/tslauth-winbind.lock": "new",
 }
 # What Samba's programs keep: the numbers of users (so that a later join finds them again), local
 # databases without a secret of the domain, sockets and logs.
@@ -153,7 +155,7 @@ def part_with_account(lab, host):
         # Numbers of users, whose file winbindd makes when it is asked.
         for user in ("CORP\\user1", "OTHER\\user2"):
             host.ok("wbinfo", "--user-info", user)
-        joined = {**KEPT_BY_SAMBA, **KEPT_BY_THE_LIBRARY, **JOIN}
+        joined = {**KEPT_BY_SAMBA, **KEPT_BY_US, **JOIN}
         joined.pop("/etc/pam.d/system-auth-generic")
         expect_differences(lab, original, snapshot(host), joined)
     with lab.step(f"{host.name}: activate, and what differs from the original:"):
@@ -170,7 +172,7 @@ def part_with_account(lab, host):
         host.tslauthctl("info")
     with lab.step(f"{host.name}: part with an account, and what differs from the original:"):
         host.part()
-        expect_differences(lab, original, snapshot(host), ACTIVATION, KEPT_BY_THE_LIBRARY,
+        expect_differences(lab, original, snapshot(host), ACTIVATION, KEPT_BY_US,
                            KEPT_BY_SAMBA)
     with lab.step(f"{host.name}: the controller has deleted its account"):
         expect_equal(lab.dc1.account_of(host), None, "the account")
@@ -178,7 +180,7 @@ def part_with_account(lab, host):
     only_local_users(lab, "parted", host)
     with lab.step(f"{host.name}: activate \"None\", and what differs from the original:"):
         host.tslauthctl("activate", "None")
-        expect_differences(lab, original, snapshot(host), KEPT_BY_THE_LIBRARY, KEPT_BY_SAMBA)
+        expect_differences(lab, original, snapshot(host), KEPT_BY_US, KEPT_BY_SAMBA)
     with lab.step(f"{host.name}: the policy has the entries that it had"):
         same_entries(policy, host.read("/etc/pam.d/system-auth-generic"))
     only_local_users(lab, "\"None\"", host)
@@ -186,7 +188,7 @@ def part_with_account(lab, host):
         host.join()
         host.tslauthctl("info")
         host.part()
-        expect_differences(lab, original, snapshot(host), KEPT_BY_THE_LIBRARY, KEPT_BY_SAMBA)
+        expect_differences(lab, original, snapshot(host), KEPT_BY_US, KEPT_BY_SAMBA)
 
 
 def part_without_account(lab, host):
@@ -222,8 +224,19 @@ def part_without_account(lab, host):
         expect(lab.dc1.account_of(host), "the account is gone")
 
 
+def documented_as_left():
+    """The paths of the table in the provider's README.md."""
+    with open(os.path.join(TREE, "providers/winbind/README.md"), encoding="utf-8") as file:
+        table = file.read().partition("What is left of a membership")[2].partition("\n\nOn ")[0]
+    return sorted(re.findall(r"`(/[^`]+)`", table))
+
+
 def play(lab):
     debian, workshop = lab.hosts(2)
     at_once(lambda host: host.make_local_users(), (debian, workshop))
     part_with_account(lab, debian)
     part_without_account(lab, workshop)
+    with lab.step("providers/winbind/README.md has these paths as what a part leaves, and no other"):
+        expect_equal(documented_as_left(),
+                     sorted(re.sub(r"/?\*+$", "", path) for path in {**KEPT_BY_US, **KEPT_BY_SAMBA}),
+                     "the table")
