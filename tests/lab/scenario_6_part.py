@@ -30,13 +30,12 @@ ACTIVATION = {
     "/etc/nsswitch.conf": "changed",
     "/etc/tessel/tslauth/authentication.conf": "changed",
 }
-# The entry of the management address stays in /etc/hosts, and the policy keeps the form in which the
-# library writes it.
+# The entry of the management address stays in /etc/hosts, and the policy keeps the form in which
+# the library writes it.
 KEPT_BY_US = {
     "/etc/hosts": "changed",
     "/etc/pam.d/system-auth-generic": "changed",
     "/run/tslauthctl.lock": "new",
-    "/run/tslauth-winbind.lock": "new",
 }
 # What Samba's programs keep: the numbers of users (so that a later join finds them again), local
 # databases without a secret of the domain, sockets and logs.
@@ -130,8 +129,8 @@ def log_in_as_both(lab, host):
 def knows_nothing(lab, host):
     with lab.step(f"{host.name}: winbindd has ended, and the host keeps no secret of the domain"):
         host.exits(1, "pgrep", "-x", "winbindd")
-        databases = host.shell('for file; do tdbdump -- "$file"; done',
-                               *host.shell("ls -d /var/lib/samba/private/*.tdb || true").out.split())
+        files = host.shell("ls /var/lib/samba/private/*.tdb || true").out.split()
+        databases = host.shell('for file; do tdbdump -- "$file"; done', *files)
         kept = "\n".join(line for line in databases.out.splitlines() if line.startswith("key"))
         expect("MACHINE" not in kept and "CORP" not in kept, kept)
     with lab.step(f"{host.name}: tslauthctl info says that it is not joined (exit code 10)"):
@@ -236,7 +235,6 @@ def play(lab):
     at_once(lambda host: host.make_local_users(), (debian, workshop))
     part_with_account(lab, debian)
     part_without_account(lab, workshop)
-    with lab.step("providers/winbind/README.md has these paths as what a part leaves, and no other"):
-        expect_equal(documented_as_left(),
-                     sorted(re.sub(r"/?\*+$", "", path) for path in {**KEPT_BY_US, **KEPT_BY_SAMBA}),
-                     "the table")
+    with lab.step("providers/winbind/README.md says that these paths are left, and no other"):
+        expect_equal(documented_as_left(), sorted(
+            re.sub(r"/?\*+$", "", path) for path in (*KEPT_BY_US, *KEPT_BY_SAMBA)), "the table")
