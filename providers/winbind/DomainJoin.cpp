@@ -28,6 +28,7 @@ namespace {
 
 /// Of the time for a join, what is kept for undoing it.
 constexpr auto undoTime = std::chrono::seconds(35);
+constexpr auto answerLimit = std::chrono::seconds(3);
 constexpr auto toolLimit = std::chrono::seconds(45);
 /// How much earlier than this join an account must have been made to be somebody else's work.
 constexpr auto clockTolerance = std::chrono::seconds(3);
@@ -124,9 +125,13 @@ public:
         try {
             _tools.Join(_controller.controller, account, unit, ToolDeadline());
         } catch (Failure const& e) {
-            if (e.Code() == TSLAUTH_PROVIDER_TIMED_OUT) {
-                LogWarning(_controller.controller + " may have made the account '" + _computer +
-                           "$' before it fell silent");
+            bool const isOpen = e.Code() == TSLAUTH_PROVIDER_TIMED_OUT || e.Code() == SeeSystemLog;
+            if (isOpen && !Answers()) {
+                throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
+                              "'" + _controller.controller +
+                                  "' has fallen silent, and may have made "
+                                  "the account '" +
+                                  _computer + "$': " + e.what());
             }
             throw;
         }
@@ -178,6 +183,15 @@ public:
     }
 
 private:
+    bool Answers() const {
+        try {
+            (void)_tools.Lookup(_controller.controller, Clock::now() + answerLimit);
+            return true;
+        } catch (Failure const&) {
+            return false;
+        }
+    }
+
     Clock::time_point ToolDeadline() const {
         return std::min(_deadline, Clock::now() + toolLimit);
     }

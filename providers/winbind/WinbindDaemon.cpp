@@ -55,8 +55,9 @@ void RequireSuccess(std::string const& what, ChildProcess::Outcome const& outcom
         throw Failure(TSLAUTH_PROVIDER_TIMED_OUT, what + " did not end in time");
     }
     if (outcome.code != 0) {
-        throw Failure(TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE,
-                      what + ": " + ToolFailureText(outcome.output));
+        throw Failure(TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE, what + " ended with code " +
+                                                               std::to_string(outcome.code) + ": " +
+                                                               ToolFailureText(outcome.output));
     }
 }
 
