@@ -158,15 +158,34 @@ class Node:
         return found
 
 
+_BESIDE = concurrent.futures.ThreadPoolExecutor(max_workers=64)
+
+
+class Story:
+    """Steps of one host, (text, function) each, that are taken one after the other beside what else
+    goes on. `Lab.tell` shows them."""
+
+    def __init__(self, *steps):
+        self.outcomes = [(text, concurrent.futures.Future()) for text, _ in steps]
+        _BESIDE.submit(self._play, [function for _, function in steps])
+
+    def _play(self, functions):
+        for function, (_, future) in zip(functions, self.outcomes):
+            start = time.monotonic()
+            try:
+                function()
+                future.set_result(time.monotonic() - start)
+            except BaseException as failure:  # pylint: disable=broad-exception-caught
+                future.set_exception(failure)
+
+
 class LogIn:
     """A user who logs in through the policy. It starts at once and runs beside others, since
     libpam takes two seconds before it says no."""
 
-    _threads = concurrent.futures.ThreadPoolExecutor(max_workers=64)
-
     def __init__(self, host, user, password):
         self._user = user
-        self._result = self._threads.submit(
+        self._result = _BESIDE.submit(
             host.run, "pamtester", LOGIN_SERVICE, user, "authenticate", "acct_mgmt",
             text=password + "\n")
 
@@ -278,6 +297,12 @@ class Lab:
             print(f"  ok  {text:<76} {measures}", flush=True)
             for line in self._said:
                 print(f"      {line}", flush=True)
+
+
+    def tell(self, story):
+        for text, future in story.outcomes:
+            with self.step(text) as step:
+                step.took(future.result())
 
 
 def expect(condition, text):

@@ -3,7 +3,7 @@
 import json
 import re
 
-from lab import PASSWORD, at_once, expect, expect_equal, until
+from lab import PASSWORD, Story, at_once, expect, expect_equal, until
 
 TITLE = "The domain's answers, and what the controllers say"
 
@@ -117,9 +117,10 @@ def controllers(lab, host, about):
         listed = controllers_of(node, domain)
         with lab.step(f"a controller of {domain} is {', '.join(listed)}, as its DNS says"):
             expect(listed, "DNS lists none")
-            for name in (domain, short):
+            for name, told in zip((domain, short), at_once(
+                    lambda name: host.tslauthctl("dc", name).out.strip(), (domain, short))):
                 expect(about[name]["dc"] in listed, f"the library: {about[name]['dc']}")
-                expect(host.tslauthctl("dc", name).out.strip() in listed, "tslauthctl says another")
+                expect(told in listed, f"tslauthctl: {told}")
     with lab.step("nowhere.example has none: there is no such domain"):
         expect(about["nowhere.example"]["dc"].startswith(NO_SUCH_DOMAIN),
                about["nowhere.example"]["dc"])
@@ -139,11 +140,11 @@ def relationships(lab, about):
 
 def principal(lab, host, about):
     expected = f"host/{host.name}.corp.example@CORP.EXAMPLE"
-    with lab.step(f"the principal is {expected} in every domain, and the account has it"):
-        for name in DOMAINS[:-1]:
+    with lab.step(f"the principal is {expected}, and the account has it"):
+        for name, told in zip(DOMAINS, at_once(
+                lambda name: host.tslauthctl("principal", name).out.strip(), DOMAINS[:-1])):
             expect_equal(about[name]["principal"], expected, f"the library's for {name}")
-            expect_equal(host.tslauthctl("principal", name).out.strip(), expected,
-                         f"tslauthctl's for {name}")
+            expect_equal(told, expected, f"tslauthctl's for {name}")
         names = lab.dc1.account_of(host, "servicePrincipalName")["servicePrincipalName"]
         expect(expected.partition("@")[0].lower() in [name.lower() for name in names], str(names))
     for user in ("user1@CORP.EXAMPLE", "user2@OTHER.EXAMPLE"):
@@ -172,13 +173,12 @@ def canonical(lab, host):
     }
     for expected, names in forms.items():
         node = lab.dc1 if expected.startswith("CORP") else lab.dc2
-        with lab.step(f"{expected} is what {', '.join(names)} are here"):
+        with lab.step(f"{expected} is {', '.join(names)}"):
             asked = host.library("canonical", *names)
             expect_equal(asked.out.splitlines(), [f"{name}={expected}" for name in names],
                          "the library's answers")
-            for name in names:
-                expect_equal(host.tslauthctl("canonical", name).out.strip(), expected,
-                             f"tslauthctl's for {name}")
+            told = at_once(lambda name: host.tslauthctl("canonical", name).out.strip(), names)
+            expect_equal(told, [expected] * len(names), "tslauthctl's answers")
         with lab.step(f"{expected} is the user of that identifier on {node.name}"):
             found = node.directory(f"(sAMAccountName={expected.partition(chr(92))[2]})",
                                    "objectSid", "canonicalName")[0]
@@ -207,34 +207,47 @@ def start_winbindd(host):
     until("winbindd answers", lambda: host.run("wbinfo", "--ping").code == 0)
 
 
-def preferred(lab, host):
+def preferred(host):
     """The preferred controllers, through library and tool, in other processes than set them."""
-    lists = ["dc1.corp.example", "dc7.corp.example"], ["dc1.corp.example"], []
-    with lab.step("the library prefers two controllers, and tslauthctl knows them"):
-        result = host.library("prefer", *lists[0])
+    two, one = ["dc1.corp.example", "dc7.corp.example"], ["dc1.corp.example"]
+
+    def prefer_two():
+        result = host.library("prefer", *two)
         expect_equal((result.code, result.out), (0, ""), "what the library's call came to")
-        expect_equal(host.tslauthctl("preferred-dcs").out.split(), lists[0], "the list")
-        expect_equal(info(host)["preferred_domain_controllers"], lists[0], "the list of info")
-    with lab.step("tslauthctl prefers one, and the library knows it"):
-        host.tslauthctl("preferred-dcs", "set", *lists[1])
-        expect_equal(ask(host)[0]["preferred"], lists[1], "the list")
-    with lab.step("winbindd is to ask it first (testparm), and still answers"):
+        expect_equal(host.tslauthctl("preferred-dcs").out.split(), two, "the list")
+        expect_equal(info(host)["preferred_domain_controllers"], two, "the list of info")
+
+    def prefer_one():
+        host.tslauthctl("preferred-dcs", "set", *one)
+        expect_equal(ask(host)[0]["preferred"], one, "the list")
+
+    def tell_winbindd():
         servers = host.ok("testparm", "-s", "--parameter-name=password server").out.split()
-        expect(servers[0].strip(",") == lists[1][0], str(servers))
+        expect_equal(servers[0].strip(","), one[0], "the first of winbindd's controllers")
         until("the trust is healthy", lambda: state(host) == HEALTHY)
-    with lab.step("winbindd is stopped and started: it is still preferred"):
+
+    def restart():
         stop_winbindd(host)
         start_winbindd(host)
-        expect_equal(ask(host)[0]["preferred"], lists[1], "the list")
+        expect_equal(ask(host)[0]["preferred"], one, "the list")
         until("the trust is healthy", lambda: state(host) == HEALTHY)
-    with lab.step("tslauthctl preferred-dcs clear: none is preferred"):
+
+    def prefer_none():
         host.tslauthctl("preferred-dcs", "clear")
-        expect_equal(ask(host)[0]["preferred"], lists[2], "the list")
+        expect_equal(ask(host)[0]["preferred"], [], "the list")
         expect_equal(host.tslauthctl("preferred-dcs").out, "", "tslauthctl's list")
+
+    return Story(
+        (f"{host.name}, the library prefers two controllers: tslauthctl knows them", prefer_two),
+        (f"{host.name}, tslauthctl prefers one: the library knows it", prefer_one),
+        (f"{host.name}, winbindd is to ask it first (testparm), and answers", tell_winbindd),
+        (f"{host.name}, winbindd is stopped and started: it is still preferred", restart),
+        (f"{host.name}, tslauthctl preferred-dcs clear: none is preferred", prefer_none))
 
 
 def trust_states(lab, host):
-    with lab.step(f"winbindd is stopped: the trust state is {NOT_RUNNING}"):
+    """What makes a trust unhealthy, and healthy again."""
+    def stop():
         stop_winbindd(host)
         answers, about = ask(host, "corp.example")
         expect_equal(int(answers["state"]), NOT_RUNNING, "the trust state")
@@ -243,38 +256,56 @@ def trust_states(lab, host):
         expect(answers["domain"].startswith("DNS Name: corp.example,"), answers["domain"])
         expect(about["corp.example"]["dc"].startswith("ServiceNotActiveException: "),
                about["corp.example"]["dc"])
-    with lab.step("tslauthctl info says the same, and that it is not complete"):
+
+    def tell():
         document = info(host, REFUSED)
         expect_equal(document["trust_state"], NOT_RUNNING, "the trust state")
         expect_equal([(failure["of"], failure["exception"].rpartition(":")[2])
                       for failure in document["failures"]],
                      [("trusted_domains", "ServiceNotActiveException")], "the failures")
-    with lab.step(f"winbindd is started: the trust state is {HEALTHY}"):
+
+    def start():
         start_winbindd(host)
         until("the trust is healthy", lambda: state(host) == HEALTHY)
-    with lab.step(f"the controller changes the account's secret: the state is {SECRET_REFUSED}"):
+
+    def change_secret():
         lab.dc1.samba_tool("user", "setpassword", f"{host.name}$",
                            "--newpassword=Another-Secret-1")
         until("the secret is refused", lambda: state(host) == SECRET_REFUSED)
         expect_equal(info(host)["trust_state"], SECRET_REFUSED, "tslauthctl's")
-    with lab.step(f"part and join give it a new one: the trust state is {HEALTHY}"):
+
+    def join_again():
         host.part()
         host.join()
         expect_equal(state(host), HEALTHY, "the trust state")
-    with lab.step(f"the account is deleted on the controller: the trust state is {SECRET_REFUSED}"):
+
+    def delete_account():
         lab.dc1.samba_tool("computer", "delete", host.name)
         until("the secret is refused", lambda: state(host) == SECRET_REFUSED)
 
+    return Story(
+        (f"{host.name}, winbindd is stopped: the trust state is {NOT_RUNNING}", stop),
+        (f"{host.name}, tslauthctl info says so, and that it cannot tell everything", tell),
+        (f"{host.name}, winbindd is started: the trust state is {HEALTHY}", start),
+        (f"{host.name}, the controller changes its secret: the trust state is {SECRET_REFUSED}",
+         change_secret),
+        (f"{host.name}, part and join: the trust state is {HEALTHY}", join_again),
+        (f"{host.name}, the controller deletes its account: the trust state is {SECRET_REFUSED}",
+         delete_account))
+
 
 def play(lab):
-    host, other = lab.hosts(2)
+    host, third, other = lab.hosts(3)
     before_the_join(lab, host)
-    with lab.step("two hosts join corp.example"):
-        at_once(lambda each: each.join(), (host, other))
+    with lab.step("three hosts join corp.example"):
+        at_once(lambda each: each.join(), (host, third, other))
+    # Beside each other, each on a host of its own.
+    states = trust_states(lab, other)
+    preferences = preferred(third)
     about = own_domain(lab, host)
     controllers(lab, host, about)
     relationships(lab, about)
     principal(lab, host, about)
     canonical(lab, host)
-    preferred(lab, host)
-    trust_states(lab, other)
+    lab.tell(preferences)
+    lab.tell(states)
