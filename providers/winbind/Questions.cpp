@@ -6,6 +6,7 @@
 #include "DirectoryNames.h"
 #include "DirectorySearch.h"
 #include "Failure.h"
+#include "LastAnswer.h"
 #include "SystemLog.h"
 #include "TextPieces.h"
 #include "WinbindClient.h"
@@ -118,15 +119,25 @@ std::vector<Domain> OtherDomains(WinbindClient const& client, Domain const& own)
     return others;
 }
 
-/// The trusts of the host's domain, all or those to the domain `name`.
-std::vector<DirectoryEntry> FindTrusts(std::string const& name, Clock::time_point deadline) {
-    std::string filter = "(objectClass=trustedDomain)";
-    if (!name.empty()) {
-        std::string const escaped = EscapedForFilter(name);
-        filter = "(&" + filter + "(|(trustPartner=" + escaped + ")(flatName=" + escaped + ")))";
-    }
+/// The trusts of the host's domain that `filter` selects.
+std::vector<DirectoryEntry> SearchTrusts(std::string const& filter, Clock::time_point deadline) {
     return SearchDirectory(
         "", filter, {"trustPartner", "flatName", "trustDirection", "trustAttributes"}, deadline);
+}
+
+std::vector<DirectoryEntry> AllTrusts(Clock::time_point deadline) {
+    return SearchTrusts("(objectClass=trustedDomain)", deadline);
+}
+
+/// Those to the domain `name`.
+std::vector<DirectoryEntry> FindTrusts(std::string const& name, Clock::time_point deadline) {
+    std::string const escaped = EscapedForFilter(WithoutRoot(name));
+    if (escaped.empty()) {
+        return {};
+    }
+    return SearchTrusts("(&(objectClass=trustedDomain)(|(trustPartner=" + escaped +
+                            ")(flatName=" + escaped + ")))",
+                        deadline);
 }
 
 /// The domains of trusts whose users may log in here.
@@ -296,15 +307,19 @@ std::vector<Domain> GetTrustedDomains() {
     if (!own) {
         return {};
     }
-    // A domain behind another one is nobody's trust in the directory, and known once it was met.
-    std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
-    std::vector<Domain> domains = DomainsOf(FindTrusts("", deadline));
-    for (Domain const& domain : remembered) {
-        if (!Contains(domains, domain)) {
-            domains.push_back(domain);
+    static LastAnswer<std::vector<Domain>>& last =
+        *std::make_unique<LastAnswer<std::vector<Domain>>>().release(); // as long as any thread
+    return last.Get(*own, [&] {
+        // A domain behind another one is nobody's trust in the directory, and known once it was met.
+        std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
+        std::vector<Domain> domains = DomainsOf(AllTrusts(deadline));
+        for (Domain const& domain : remembered) {
+            if (!Contains(domains, domain)) {
+                domains.push_back(domain);
+            }
         }
-    }
-    return domains;
+        return domains;
+    });
 }
 
 std::string GetAnyDomainController(std::string const& site, std::string const& domain) {

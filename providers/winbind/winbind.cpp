@@ -2,9 +2,11 @@
 #include "Boundary.h"
 #include "Directory.h"
 #include "Failure.h"
+#include "LastAnswer.h"
 #include "Questions.h"
 #include "tslauth_winbind_provider.h"
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -77,7 +79,11 @@ static int GetTrustedDomainsEntry(ActiveDirectoryClientDomain*** domains,
 }
 
 static int GetMachineAccountDNEntry(char** name, ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("get machine account DN", [&] { HandOut(GetMachineAccountDN(), name, release); });
+    return CodeOf("get machine account DN", [&] {
+        static LastAnswer<std::string>& last =
+            *std::make_unique<LastAnswer<std::string>>().release(); // as long as any thread
+        HandOut(last.Get(GetActiveDomain(), [] { return GetMachineAccountDN(); }), name, release);
+    });
 }
 
 static int GetAnyDomainControllerEntry(char const* first, char const* domain, char** controller,
