@@ -26,7 +26,7 @@ public:
     template <typename Question>
     Answer Get(authentication::Domain const& own, Question const& ask) {
         try {
-            Answer const answer = ask();
+            Answer answer = ask();
             std::lock_guard<std::mutex> const guard(_lock);
             _last.emplace(own, answer);
             return answer;
