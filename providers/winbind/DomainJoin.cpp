@@ -142,7 +142,7 @@ public:
     }
 
     /// @param controllers for the host's configuration
-    /// @param account who can undo the join; null: nobody
+    /// @param account who can undo the join; null: the account was not made by it
     void Finish(std::vector<std::string> const& controllers, Account const* account) {
         HostChanges changes;
         try {
@@ -155,15 +155,21 @@ public:
                 secrets, changes, _deadline);
         } catch (Failure const& e) {
             bool const isWhole = changes.Undo();
-            std::string const text =
+            std::string text =
                 "'" + _controller.controller +
                 "' accepted the join, and it could not be finished here: " + e.what();
-            std::string const left = LeftInDirectory(account);
-            if (!left.empty() || !isWhole) {
-                throw Failure(HalfDone,
-                              text + "; " + (isWhole ? left : "the host is not as it was"));
+            std::string left;
+            if (account) {
+                left = LeftInDirectory(*account);
+                text += left.empty() ? "; the account was deleted again" : "; " + left;
+            } else {
+                // Whoever made the account knows of it, and this join has changed nothing of it.
+                text += "; the account that was made for it stays in the directory";
             }
-            throw Failure(e.Code(), text + "; the account was deleted again");
+            if (!isWhole) {
+                text += "; the host is not as it was";
+            }
+            throw Failure(isWhole && left.empty() ? e.Code() : HalfDone, text);
         }
         changes.Keep();
     }
@@ -198,19 +204,16 @@ private:
 
     /// Deletes the account that this join has made.
     /// @return what stays there, or empty
-    std::string LeftInDirectory(Account const* account) {
+    std::string LeftInDirectory(Account const& account) {
         std::string const name = "the account '" + _computer + "$'";
-        if (!account) {
-            return name + " stays in the directory";
-        }
         auto const deadline = Clock::now() + undoTime / 3;
         try {
             std::string const made = _tools.ComputerAttribute(_controller.controller, _computer,
-                                                              "whenCreated", *account, deadline);
+                                                              "whenCreated", account, deadline);
             if (made < _begin) {
                 return name + " was there before, and stays, with another password";
             }
-            _tools.Leave(_controller.controller, account, deadline);
+            _tools.Leave(_controller.controller, &account, deadline);
             return {};
         } catch (Failure const& e) {
             return name + " could not be deleted: " + e.what();

@@ -36,6 +36,7 @@ constexpr auto longPause = std::chrono::milliseconds(250);
 /// What it is given to end by itself.
 constexpr auto politeness = std::chrono::seconds(5);
 constexpr auto helperPatience = std::chrono::seconds(2);
+constexpr auto refusalPatience = std::chrono::seconds(6);
 constexpr auto onePing = std::chrono::seconds(2);
 
 bool SystemdManages() {
@@ -199,12 +200,17 @@ void WinbindDaemon::Reload() const noexcept {
 }
 
 void WinbindDaemon::CheckTrust(Clock::time_point deadline) {
+    // A controller that has not heard of a new secret yet hears of it soon, or another one is asked.
+    auto const certain = std::min(deadline, Clock::now() + refusalPatience);
     for (;;) {
         try {
             WinbindClient(deadline).CheckTrustCredentials();
             return;
-        } catch (Failure const&) {
-            if (Clock::now() + longPause >= deadline) {
+        } catch (Failure const& e) {
+            bool const isRefused = e.Code() == TSLAUTH_PROVIDER_LOGON_FAILURE ||
+                                   e.Code() == TSLAUTH_PROVIDER_ACCESS_DENIED ||
+                                   e.Code() == TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT;
+            if (Clock::now() + longPause >= (isRefused ? certain : deadline)) {
                 throw;
             }
         }
