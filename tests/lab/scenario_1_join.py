@@ -1,6 +1,6 @@
 # SPDX-License-Identifier: Apache-2.0
 """Hosts join with credentials, and users log in through what the library wrote."""
-from lab import LOCAL_PASSWORD, LogIn, PASSWORD, at_once, expect, expect_equal
+from lab import LOCAL_PASSWORD, LogIn, PASSWORD, Story, at_once, expect, expect_equal
 
 TITLE = "Joining with credentials, and logging in"
 
@@ -74,28 +74,35 @@ def join_by_library(host, target, *options):
     succeeded(host.library("join", target, "joiner1", *options, text=PASSWORD + "\n"))
 
 
+def join_story(lab, host, text, join, folder):
+    """A host that joins, and what the controller then says of it."""
+    return Story(
+        (f"{host.name}: {text}", join),
+        (f"{host.name}: on the controller its account stands in {folder}",
+         lambda: stands_in(lab, host, folder)),
+        (f"{host.name}: the controller takes its secret (net ads testjoin)",
+         lambda: host.ok("net", "ads", "testjoin")))
+
+
 def joins(lab, path, short, long):
-    """Three hosts whose accounts go to a unit."""
+    """Three hosts whose accounts go to a unit, at the same time."""
     before = {name: long.read(name) for name in NETWORK_FILES}
-    with lab.step(f"{path.name}: the library's JoinDomain, with the unit Servers/Linux"):
-        join_by_library(path, "corp.example/Servers/Linux")
-    with lab.step(f"{short.name}: the library's JoinDomain, with the unit OU=Linux,OU=Servers"):
-        join_by_library(short, "corp.example/OU=Linux,OU=Servers", "skip-hostname-check")
-    with lab.step(f"{long.name}: tslauthctl join --skip-hostname-check, with the unit's full DN"):
-        long.join(f"corp.example/{LINUX}", "--skip-hostname-check")
-    for host in (path, short, long):
-        with lab.step(f"{host.name}: on the controller its account stands in {LINUX}"):
-            stands_in(lab, host, LINUX)
+    for story in (
+            join_story(lab, path, "the library's JoinDomain, with the unit Servers/Linux",
+                       lambda: join_by_library(path, "corp.example/Servers/Linux"), LINUX),
+            join_story(lab, short, "the library's JoinDomain, with the unit OU=Linux,OU=Servers",
+                       lambda: join_by_library(short, "corp.example/OU=Linux,OU=Servers",
+                                               "skip-hostname-check"), LINUX),
+            join_story(lab, long, "tslauthctl join --skip-hostname-check, with the unit's full DN",
+                       lambda: long.join(f"corp.example/{LINUX}", "--skip-hostname-check"), LINUX)):
+        lab.tell(story)
     with lab.step(f"{long.name}: {' and '.join(NETWORK_FILES)} are as they were"):
         for name, text in before.items():
             expect_equal(long.read(name), text, name)
 
 
 def plain_join(lab, host):
-    with lab.step(f"{host.name}: tslauthctl join corp.example"):
-        host.join()
-    with lab.step(f"{host.name}: on the controller its account stands in {COMPUTERS}"):
-        stands_in(lab, host, COMPUTERS)
+    lab.tell(join_story(lab, host, "tslauthctl join corp.example", host.join, COMPUTERS))
     with lab.step(f"{host.name}: its address has the name {host.name}.corp.example"):
         address = host.ok("hostname", "-I").out.strip()
         expect_equal(host.ok("getent", "hosts", address).out.split()[1:],
@@ -135,24 +142,21 @@ def play(lab):
     at_once(lambda host: host.make_local_users(), (plain, path))
     baseline = fastest_log_in(plain)
     attempts = begin(plain, LOCAL_USERS + STRANGERS)
-    with lab.step(f"not joined, {plain.name}: getent passwd knows no CORP\\user1"):
+    with lab.step(f"before the join, {plain.name}: getent passwd knows no CORP\\user1"):
         unknown(plain, "CORP\\user1")
     joins(lab, path, short, long)
-    finish(lab, "not joined", attempts)
+    finish(lab, "before the join", attempts)
 
     plain_join(lab, plain)
-    for host in (plain, path, short, long):
-        with lab.step(f"{host.name}: the controller takes its secret (net ads testjoin)"):
-            host.ok("net", "ads", "testjoin")
 
     attempts = begin(plain, LOCAL_USERS + STRANGERS)
-    with lab.step(f"not active, {plain.name}: getent passwd knows no CORP\\user1"):
+    with lab.step(f"joined only, {plain.name}: getent passwd knows no CORP\\user1"):
         unknown(plain, "CORP\\user1")
     with lab.step(f"{path.name}: the library's MakeActive"):
         succeeded(path.library("activate"))
         is_activated(path)
     more_attempts = begin(path, LOCAL_USERS + DOMAIN_USERS[:2])
-    finish(lab, "not active", attempts)
+    finish(lab, "joined only", attempts)
     with lab.step(f'{plain.name}: tslauthctl activate "Active Directory"'):
         plain.tslauthctl("activate", "Active Directory")
         is_activated(plain)
@@ -169,8 +173,8 @@ def play(lab):
     with lab.step(f"{plain.name}: getent passwd knows no user1, and no CORP\\nobody"):
         unknown(plain, "user1")
         unknown(plain, "CORP\\nobody")
-    finish(lab, "active", attempts + more_attempts)
-    with lab.step(f"active, {plain.name}: lena logs in as fast as before the join") as step:
+    finish(lab, "activated", attempts + more_attempts)
+    with lab.step(f"activated, {plain.name}: lena logs in as fast as before the join") as step:
         seconds = fastest_log_in(plain)
         step.took(seconds)
         step.note(f"{1000 * baseline:.0f} ms before")
