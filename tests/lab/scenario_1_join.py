@@ -11,6 +11,9 @@ NETWORK_FILES = ("/etc/hosts", "/etc/resolv.conf")
 # milliseconds, and a question that waits for the network takes seconds.
 LOCAL_SLACK = 0.1
 
+# What a shell, smb.conf or another encoding than UTF-8 would make something else of.
+ODD_PASSWORD = """ Aä"'#=%;$(x)\\1 """
+
 # User, password, what is shown, and what the user is told where the answer is no.
 NO = "pamtester: Authentication failure"
 UNKNOWN = "pamtester: User not known to the underlying authentication module"
@@ -24,7 +27,9 @@ DOMAIN_USERS = (
     ("CORP\\user1", PASSWORD, "logs in", None),
     ("CORP\\user1", "Not-the-Passw0rd", "is refused with a wrong password", NO),
     ("CORP\\user1", LOCAL_PASSWORD, "is refused with the password of root and lena", NO),
+    ("user1@corp.example", PASSWORD, "logs in", None),
     ("OTHER\\user2", PASSWORD, "of the trusted domain logs in", None),
+    ("user2@other.example", PASSWORD, "of the trusted domain logs in", None),
     ("OTHER\\user2", "Not-the-Passw0rd", "is refused with a wrong password", NO),
     ("CORP\\disabled1", PASSWORD, "whose account is disabled is refused",
      "Your account is disabled"),
@@ -74,9 +79,20 @@ def join_by_library(host, target, *options):
     succeeded(host.library("join", target, "joiner1", *options, text=PASSWORD + "\n"))
 
 
-def join_story(lab, host, text, join, folder):
+def odd_user(host):
+    """Of this host's own, since an account is there once."""
+    return f"odd-{host.name}"
+
+
+def make_odd_user(lab, host):
+    lab.dc1.samba_tool("user", "create", odd_user(host), ODD_PASSWORD)
+    lab.dc1.samba_tool("group", "addmembers", "Domain Admins", odd_user(host))
+
+
+def join_story(lab, host, text, join, folder, *before):
     """A host that joins, and what the controller then says of it."""
     return Story(
+        *before,
         (f"{host.name}: {text}", join),
         (f"{host.name}: on the controller its account stands in {folder}",
          lambda: stands_in(lab, host, folder)),
@@ -94,7 +110,10 @@ def joins(lab, path, short, long):
                        lambda: join_by_library(short, "corp.example/OU=Linux,OU=Servers",
                                                "skip-hostname-check"), LINUX),
             join_story(lab, long, "tslauthctl join --skip-hostname-check, with the unit's full DN",
-                       lambda: long.join(f"corp.example/{LINUX}", "--skip-hostname-check"), LINUX)):
+                       lambda: long.join(f"corp.example/{LINUX}", "--skip-hostname-check",
+                                         user=odd_user(long), password=ODD_PASSWORD), LINUX,
+                       (f"dc1: {odd_user(long)}, who joins it, has the password {ODD_PASSWORD!r}",
+                        lambda: make_odd_user(lab, long)))):
         lab.tell(story)
     with lab.step(f"{long.name}: {' and '.join(NETWORK_FILES)} are as they were"):
         for name, text in before.items():
@@ -161,7 +180,8 @@ def play(lab):
         plain.tslauthctl("activate", "Active Directory")
         is_activated(plain)
 
-    attempts = begin(plain, LOCAL_USERS + DOMAIN_USERS)
+    odd = (f"CORP\\{odd_user(long)}", ODD_PASSWORD, "logs in", None)
+    attempts = begin(plain, (*LOCAL_USERS, *DOMAIN_USERS, odd))
     for host in (plain, path):
         with lab.step(f"{host.name}: getent passwd 'CORP\\user1' and the controller agree"):
             resolves(lab.dc1, host, "CORP", "user1")
