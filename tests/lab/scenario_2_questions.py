@@ -17,6 +17,21 @@ NO_SUCH_DOMAIN = "NoSuchDomainException: "
 # Of the directory (MS-ADTS 6.1.6.7.9 and 6.1.6.7.12).
 WITHIN_FOREST, FOREST_TRANSITIVE = 0x20, 0x8
 
+# Passes on what a controller is asked before anything else (CLDAP, by UDP), and notes who asks.
+RELAY = """
+import socket
+relay = socket.socket(socket.AF_INET, socket.SOCK_DGRAM)
+relay.bind(("", 389))
+open("/run/relay.ready", "w").close()
+while True:
+    question, client = relay.recvfrom(65535)
+    print(client[0], flush=True)
+    with socket.socket(socket.AF_INET, socket.SOCK_DGRAM) as controller:
+        controller.settimeout(5)
+        controller.sendto(question, ("10.99.0.1", 389))
+        relay.sendto(controller.recv(65535), client)
+"""
+
 
 def ask(host, *domains):
     """What the library tells: name -> text, and for the domains, domain -> (name -> text)."""
@@ -207,9 +222,23 @@ def start_winbindd(host):
     until("winbindd answers", lambda: host.run("wbinfo", "--ping").code == 0)
 
 
-def preferred(host):
+def start_relay(node):
+    node.shell('setsid /usr/bin/python3 -c "$1" >/run/relay.asked 2>&1 </dev/null &', RELAY)
+    until("the relay is ready", lambda: node.run("test", "-e", "/run/relay.ready").code == 0)
+
+
+def preferred(host, relay):
     """The preferred controllers, through library and tool, in other processes than set them."""
     two, one = ["dc1.corp.example", "dc7.corp.example"], ["dc1.corp.example"]
+
+    def join():
+        address = host.ok("hostname", "-I").out.strip()
+        start_relay(relay)
+        host.shell('echo "$1 relay.corp.example" >>/etc/hosts',
+                   relay.ok("hostname", "-I").out.strip())
+        host.tslauthctl("preferred-dcs", "set", "relay.corp.example")
+        host.join()
+        expect(address in relay.read("/run/relay.asked").split(), "the relay was not asked")
 
     def prefer_two():
         result = host.library("prefer", *two)
@@ -238,6 +267,7 @@ def preferred(host):
         expect_equal(host.tslauthctl("preferred-dcs").out, "", "tslauthctl's list")
 
     return Story(
+        (f"{host.name}, a preference is set before the join: the join asks that name", join),
         (f"{host.name}, the library prefers two controllers: tslauthctl knows them", prefer_two),
         (f"{host.name}, tslauthctl prefers one: the library knows it", prefer_one),
         (f"{host.name}, winbindd is to ask it first (testparm), and answers", tell_winbindd),
@@ -295,13 +325,13 @@ def trust_states(lab, host):
 
 
 def play(lab):
-    host, third, other = lab.hosts(3)
+    host, other, third = lab.hosts(3)
     before_the_join(lab, host)
-    with lab.step("three hosts join corp.example"):
-        at_once(lambda each: each.join(), (host, third, other))
     # Beside each other, each on a host of its own.
+    preferences = preferred(third, relay=host)
+    with lab.step("two hosts join corp.example"):
+        at_once(lambda each: each.join(), (host, other))
     states = trust_states(lab, other)
-    preferences = preferred(third)
     about = own_domain(lab, host)
     controllers(lab, host, about)
     relationships(lab, about)
