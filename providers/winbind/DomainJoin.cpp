@@ -89,6 +89,15 @@ std::string GeneralizedTime(std::chrono::system_clock::time_point time) {
     return text.data();
 }
 
+/// Whether `net` may fail with this after the controller has made the account. What it says of
+/// names, rights and passwords comes before.
+bool MayComeFromTheMiddle(ActiveDirectoryClientErrorCode code) {
+    return code == SeeSystemLog || code == TSLAUTH_PROVIDER_TIMED_OUT ||
+           code == TSLAUTH_PROVIDER_NO_LOGON_SERVERS || code == TSLAUTH_PROVIDER_NO_NETWORK ||
+           code == TSLAUTH_PROVIDER_CONNECTION_INVALID ||
+           code == TSLAUTH_PROVIDER_CONNECTION_REFUSED;
+}
+
 /// A membership in the making, with what its undoing needs.
 class Join {
 public:
@@ -125,13 +134,8 @@ public:
         try {
             _tools.Join(_controller.controller, account, unit, ToolDeadline());
         } catch (Failure const& e) {
-            bool const isOpen = e.Code() == TSLAUTH_PROVIDER_TIMED_OUT || e.Code() == SeeSystemLog;
-            if (isOpen && !Answers()) {
-                throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
-                              "'" + _controller.controller +
-                                  "' has fallen silent, and may have made "
-                                  "the account '" +
-                                  _computer + "$': " + e.what());
+            if (MayComeFromTheMiddle(e.Code())) {
+                ThrowInterrupted(e, account);
             }
             throw;
         }
@@ -202,6 +206,22 @@ private:
         return std::min(_deadline, Clock::now() + toolLimit);
     }
 
+    /// The controller fell silent, or `net` failed for a reason without a name: it may have made the
+    /// account by then.
+    [[noreturn]] void ThrowInterrupted(Failure const& failure, Account const& account) {
+        if (!Answers()) {
+            throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
+                          "'" + _controller.controller +
+                              "' has fallen silent, and may have made the account '" + _computer +
+                              "$': " + failure.what());
+        }
+        std::string const left = LeftInDirectory(account);
+        if (!left.empty()) {
+            throw Failure(HalfDone, left + ": " + failure.what());
+        }
+        throw Failure(failure);
+    }
+
     /// Deletes the account that this join has made.
     /// @return what stays there, or empty
     std::string LeftInDirectory(Account const& account) {
@@ -210,6 +230,9 @@ private:
         try {
             std::string const made = _tools.ComputerAttribute(_controller.controller, _computer,
                                                               "whenCreated", account, deadline);
+            if (made.empty()) {
+                return {}; // there is none
+            }
             if (made < _begin) {
                 return name + " was there before, and stays, with another password";
             }
