@@ -178,6 +178,10 @@ void HostChanges::Replace(std::string const& path, std::string const& text, mode
     struct stat like = {};
     bool const exists = ::stat(target.c_str(), &like) == 0;
     if (!exists) {
+        if (FileExists(target)) {
+            // The link would be lost, and what it should lead to is not the provider's to make.
+            throw Failure(SeeSystemLog, "'" + target + "' is a link to nothing");
+        }
         like.st_uid = ::geteuid();
         like.st_gid = ::getegid();
         like.st_mode = mode;
@@ -213,6 +217,12 @@ void HostChanges::Remove(std::string const& path) {
     } else if (errno != ENOENT && errno != ENOTDIR) {
         ThrowSystemFailure("cannot remove '" + path + "'", errno);
     }
+}
+
+void HostChanges::Mark(std::string const& path) {
+    Replace(path, "", 0600);
+    // Gone before the first original: what is kept in part is kept.
+    _originals.insert(_originals.begin(), path);
 }
 
 bool HostChanges::MakeFolder(std::string const& path, mode_t mode) {

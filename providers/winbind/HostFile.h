@@ -42,11 +42,16 @@ public:
     /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner and mode,
     /// and a link to it stays a link.
     /// @param mode for a new file
-    /// @throws Failure, and the file is as it was
+    /// @throws Failure, and the file is as it was; also where the path is a link to nothing
     void Replace(std::string const& path, std::string const& text, mode_t mode);
 
     /// Removes a file, if there is one.
     void Remove(std::string const& path);
+
+    /// Makes an empty file that is there until the changes are kept or taken back: who finds it later
+    /// knows that a process has died in between.
+    /// @throws Failure
+    void Mark(std::string const& path);
 
     /// Makes a folder, if there is none.
     /// @return whether it was made

@@ -145,7 +145,8 @@ bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
                },
                [&] { RemoveCaches(folders, membership.domain.workgroup); },
            }) &&
-           RunAll({[] { RemoveHostFile(Paths::OwnSamba); }});
+           RunAll(
+               {[] { RemoveHostFile(Paths::OwnSamba); }, [] { RemoveHostFile(Paths::OpenJoin); }});
 }
 
 } // namespace
@@ -180,6 +181,7 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
     if (!samba) {
         made.insert(Made::SambaFile);
     }
+    changes.Mark(Paths::OpenJoin);
     changes.Replace(Paths::OwnSamba,
                     Membership::Record(made) +
                         SambaDomainText(domain.samba, AdministratorSettings(samba.value_or(""))),
@@ -245,8 +247,19 @@ void CleanUp(Clock::time_point deadline) {
             RemoveKerberos(true, true);
             RemoveHostFile(Paths::OwnSamba);
         }
+        RemoveHostFile(Paths::OpenJoin);
     }
     RemoveTemporaryFiles(files);
+}
+
+void DissolveOpenJoin(Clock::time_point deadline) {
+    if (!FileExists(Paths::OpenJoin)) {
+        return;
+    }
+    if (auto const membership = Membership::Read()) {
+        LogWarning("taking back a join that did not end; its account stays in the directory");
+        Dissolve(*membership, deadline);
+    }
 }
 
 } // namespace tessel::winbind::LocalMembership

@@ -125,6 +125,32 @@ TEST(HostFileTest, ALinkStaysALink) {
     EXPECT_THAT(folder.Names(), ElementsAre("link", "target"));
 }
 
+TEST(HostFileTest, AMarkIsThereUntilTheChangesAreKeptOrTakenBack) {
+    TemporaryFolder const folder;
+    for (bool const isKept : {true, false}) {
+        HostChanges changes;
+        changes.Mark(folder / "mark");
+        EXPECT_EQ("", Contents(folder / "mark"));
+        if (isKept) {
+            changes.Keep();
+        } else {
+            EXPECT_TRUE(changes.Undo());
+        }
+        EXPECT_TRUE(folder.Names().empty());
+    }
+}
+
+TEST(HostFileTest, ALinkToNothingIsNotReplaced) {
+    TemporaryFolder const folder;
+    ASSERT_EQ(0, ::symlink("nowhere", (folder / "link").c_str()));
+    {
+        HostChanges changes;
+        EXPECT_THROW(changes.Replace(folder / "link", "new", 0600), Failure);
+    }
+    EXPECT_TRUE(S_ISLNK(StatusOf(folder / "link").st_mode));
+    EXPECT_THAT(folder.Names(), ElementsAre("link"));
+}
+
 TEST(HostFileTest, AFailureLeavesTheFileAndNothingBeside) {
     TemporaryFolder const folder;
     ASSERT_EQ(0, ::mkdir((folder / "is-a-folder").c_str(), 0755));
