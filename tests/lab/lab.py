@@ -99,12 +99,27 @@ class Node:
         """What a service that calls the library sees; its failures have exit code 1."""
         return self.run(f"{STATE}/library-client", *arguments, **options)
 
+    def by_library(self, *arguments, **options):
+        """A call of the library that must succeed and has no answer."""
+        result = self.library(*arguments, **options)
+        if result.code != 0 or result.out:
+            raise Mismatch(str(result))
+        return result
+
     def join(self, domain="corp.example", *options, user="joiner1", password=PASSWORD):
         return self.tslauthctl("join", domain, "--user", user, "--password-stdin", *options,
-                               text=password + "\n")
+                               text=password + "\n", timeout=150)
+
+    def join_by_library(self, domain="corp.example", *options):
+        return self.by_library("join", domain, "joiner1", *options, text=PASSWORD + "\n",
+                               timeout=150)
 
     def part(self, user="joiner1", password=PASSWORD):
-        return self.tslauthctl("part", "--user", user, "--password-stdin", text=password + "\n")
+        return self.tslauthctl("part", "--user", user, "--password-stdin", text=password + "\n",
+                               timeout=90)
+
+    def part_by_library(self):
+        return self.by_library("part-as", "joiner1", text=PASSWORD + "\n", timeout=90)
 
     def make_local_users(self):
         """The local user lena, a password for root, and a service to log in to."""

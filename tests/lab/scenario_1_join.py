@@ -71,14 +71,6 @@ def stands_in(lab, host, folder):
     expect_equal(account["dn"], f"CN={host.name.upper()},{folder}", "the account's place")
 
 
-def succeeded(result):
-    expect_equal((result.code, result.out), (0, ""), "what the library's call came to")
-
-
-def join_by_library(host, target, *options):
-    succeeded(host.library("join", target, "joiner1", *options, text=PASSWORD + "\n"))
-
-
 def odd_user(host):
     """Of this host's own, since an account is there once."""
     return f"odd-{host.name}"
@@ -105,10 +97,10 @@ def joins(lab, path, short, long):
     before = {name: long.read(name) for name in NETWORK_FILES}
     for story in (
             join_story(lab, path, "the library's JoinDomain, with the unit Servers/Linux",
-                       lambda: join_by_library(path, "corp.example/Servers/Linux"), LINUX),
+                       lambda: path.join_by_library("corp.example/Servers/Linux"), LINUX),
             join_story(lab, short, "the library's JoinDomain, with the unit OU=Linux,OU=Servers",
-                       lambda: join_by_library(short, "corp.example/OU=Linux,OU=Servers",
-                                               "skip-hostname-check"), LINUX),
+                       lambda: short.join_by_library("corp.example/OU=Linux,OU=Servers",
+                                                     "skip-hostname-check"), LINUX),
             join_story(lab, long, "tslauthctl join --skip-hostname-check, with the unit's full DN",
                        lambda: long.join(f"corp.example/{LINUX}", "--skip-hostname-check",
                                          user=odd_user(long), password=ODD_PASSWORD), LINUX,
@@ -172,7 +164,7 @@ def play(lab):
     with lab.step(f"joined only, {plain.name}: getent passwd knows no CORP\\user1"):
         unknown(plain, "CORP\\user1")
     with lab.step(f"{path.name}: the library's MakeActive"):
-        succeeded(path.library("activate"))
+        path.by_library("activate")
         is_activated(path)
     more_attempts = begin(path, LOCAL_USERS + DOMAIN_USERS[:2])
     finish(lab, "joined only", attempts)
