@@ -134,19 +134,53 @@ void RemoveKerberos(bool fileIsMade, bool folderIsMade) {
     }
 }
 
-/// What comes after smb.conf. The own file for Samba goes last: it says what is left to do.
+/// Stops winbindd and takes everything away that comes after smb.conf. The own file for Samba goes
+/// last: it says what is left to do.
 bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
     std::set<Made> const& made = membership.made;
-    return RunAll({
-               [&] { RestoreSecrets(folders); },
-               [&] {
-                   RemoveKerberos(made.count(Made::KerberosFile) != 0,
-                                  made.count(Made::KerberosFolder) != 0);
-               },
-               [&] { RemoveCaches(folders, membership.domain.workgroup); },
-           }) &&
-           RunAll(
-               {[] { RemoveHostFile(Paths::OwnSamba); }, [] { RemoveHostFile(Paths::OpenJoin); }});
+    WinbindDaemon const daemon(folders);
+    bool const runs = daemon.Runs();
+    bool const isWhole = RunAll({
+        [&] { daemon.Stop(Clock::now() + stopLimit); },
+        [&] {
+            if (FileExists(BeforeJoinOf(folders))) {
+                RestoreSecrets(folders);
+            }
+        },
+        [&] {
+            RemoveKerberos(made.count(Made::KerberosFile) != 0,
+                           made.count(Made::KerberosFolder) != 0);
+        },
+        [&] { RemoveCaches(folders, membership.domain.workgroup); },
+    });
+    if (runs && made.count(Made::Daemon) == 0) {
+        // It ran before the join. Whether it can serve a host without a domain is its own matter.
+        (void)RunAll({[&] { daemon.Restart(Clock::now() + stopLimit); }});
+    }
+    return isWhole && RunAll({[] { RemoveHostFile(Paths::OwnSamba); },
+                              [] { RemoveHostFile(Paths::OpenJoin); }});
+}
+
+/// What an operation that was killed has left of a membership that smb.conf does not name.
+void FinishParting(SambaFolders const& folders) {
+    auto const samba = ReadHostFile(Paths::Samba);
+    bool const isNamed = samba && HasSambaInclude(*samba, Paths::OwnSamba);
+    auto const left = Membership::ReadOwnFile();
+    if (!isNamed && !left && !FileExists(Paths::OwnSamba) && !FileExists(Paths::OwnKerberos) &&
+        !FileExists(BeforeJoinOf(folders))) {
+        return;
+    }
+    LogWarning("cleaning up after a join or a part that did not end");
+    if (isNamed) {
+        HostChanges changes;
+        changes.Replace(Paths::Samba, WithoutSambaInclude(*samba, Paths::OwnSamba), 0644);
+        changes.Keep();
+    }
+    // A join that was killed early has left no record of what it made.
+    Membership const guess = {{}, {Made::KerberosFile, Made::KerberosFolder}};
+    if (!RemoveRest(folders, left ? *left : guess)) {
+        throw Failure(SeeSystemLog, "what a join or a part has left cannot be removed");
+    }
 }
 
 } // namespace
@@ -204,6 +238,10 @@ void Dissolve(Membership const& membership, Clock::time_point deadline) {
     SambaFolders const folders = SambaFolders::Read(deadline);
     {
         HostChanges changes;
+        if (!FileExists(BeforeJoinOf(folders))) {
+            // Somebody has taken it away. The secret must not stay for want of it.
+            changes.Replace(BeforeJoinOf(folders), "", 0600);
+        }
         std::string const without =
             WithoutSambaInclude(ReadHostFile(Paths::Samba).value_or(""), Paths::OwnSamba);
         if (without.empty() && membership.made.count(Made::SambaFile) != 0) {
@@ -213,14 +251,7 @@ void Dissolve(Membership const& membership, Clock::time_point deadline) {
         }
         changes.Keep();
     }
-    WinbindDaemon const daemon(folders);
-    bool const stopped = RunAll({[&] { daemon.Stop(Clock::now() + stopLimit); }});
-    bool const removed = RemoveRest(folders, membership);
-    if (membership.made.count(Made::Daemon) == 0) {
-        // It ran before the join. Whether it can serve a host without a domain is its own matter.
-        (void)RunAll({[&] { daemon.Restart(Clock::now() + stopLimit); }});
-    }
-    if (!stopped || !removed) {
+    if (!RemoveRest(folders, membership)) {
         throw Failure(SeeSystemLog, "the host is parted, and keeps what the log names");
     }
 }
@@ -231,22 +262,10 @@ void CleanUp(Clock::time_point deadline) {
     std::vector<std::string> const files = ChangedFiles(folders);
     if (!Membership::Read()) {
         RestoreOriginals(files);
-        bool const unfinished = FileExists(Paths::OwnSamba) || FileExists(Paths::OwnKerberos) ||
-                                FileExists(BeforeJoinOf(folders));
-        if (unfinished) {
-            LogWarning("cleaning up after a join or a part that did not end");
-            auto const samba = ReadHostFile(Paths::Samba);
-            if (samba && HasSambaInclude(*samba, Paths::OwnSamba)) {
-                HostChanges changes;
-                changes.Replace(Paths::Samba, WithoutSambaInclude(*samba, Paths::OwnSamba), 0644);
-                changes.Keep();
-            }
-            if (FileExists(BeforeJoinOf(folders))) {
-                RestoreSecrets(folders);
-            }
-            RemoveKerberos(true, true);
-            RemoveHostFile(Paths::OwnSamba);
-        }
+    }
+    // Again: the original of smb.conf may be that of a member.
+    if (!Membership::Read()) {
+        FinishParting(folders);
         RemoveHostFile(Paths::OpenJoin);
     }
     RemoveTemporaryFiles(files);

@@ -45,17 +45,25 @@ std::string Membership::DNSName() const {
     return DomainName(domain.realm);
 }
 
-std::optional<Membership> Membership::Read() {
+std::optional<Membership> Membership::ReadOwnFile() {
     auto const own = ReadHostFile(Paths::OwnSamba);
     if (!own) {
         return std::nullopt;
     }
-    auto const samba = ReadHostFile(Paths::Samba);
     auto domain = ReadSambaDomain(*own);
-    if (!samba || !domain || !HasSambaInclude(*samba, Paths::OwnSamba)) {
+    if (!domain) {
         return std::nullopt;
     }
     return Membership{std::move(*domain), ReadRecord(*own)};
+}
+
+std::optional<Membership> Membership::Read() {
+    auto membership = ReadOwnFile();
+    auto const samba = ReadHostFile(Paths::Samba);
+    if (!samba || !HasSambaInclude(*samba, Paths::OwnSamba)) {
+        return std::nullopt;
+    }
+    return membership;
 }
 
 std::string Membership::Record(std::set<Made> const& made) {

@@ -30,6 +30,9 @@ struct Membership {
     /// @throws Failure where a file cannot be read
     static std::optional<Membership> Read();
 
+    /// The same where smb.conf does not count: also what a join has not reached, or a part left.
+    static std::optional<Membership> ReadOwnFile();
+
     /// What is put before the text of the own file, for `Read`. Not behind it: its last line may be
     /// one that nothing can follow.
     static std::string Record(std::set<Made> const& made);
