@@ -23,6 +23,7 @@ constexpr auto mostSkew = std::chrono::seconds(300);
 constexpr auto lookupLimit = std::chrono::seconds(4);
 constexpr auto lookupsLimit = std::chrono::seconds(20);
 constexpr auto clockLimit = std::chrono::seconds(10);
+constexpr std::size_t longestNetBIOSName = 15;
 
 /// A resolver of its own: nothing of the host process's is used or changed.
 class Resolver {
@@ -172,6 +173,32 @@ ControllerAnswer FindController(SambaTools const& tools, std::string const& doma
     }
     throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
                   "no controller of '" + domain + "' answers" + reasons);
+}
+
+bool IsNameOfController(std::string const& computer, ControllerAnswer const& answer,
+                        std::vector<std::string> const& others) {
+    auto const isSame = [&](std::string const& name) {
+        return ::strcasecmp(name.c_str(), computer.c_str()) == 0;
+    };
+    return isSame(answer.computer) ||
+           std::any_of(others.begin(), others.end(), [&](std::string const& other) {
+               return isSame(other.substr(0, other.find('.')).substr(0, longestNetBIOSName));
+           });
+}
+
+void CheckHostName(std::string const& computer, ControllerAnswer const& answer,
+                   std::string const& domain) {
+    std::vector<std::string> others;
+    try {
+        others = AskDNS(domain);
+    } catch (Failure const& e) {
+        // A preferred controller answered, and DNS is not needed any more.
+        LogWarning(std::string("the names of the other controllers are not known: ") + e.what());
+    }
+    if (IsNameOfController(computer, answer, others)) {
+        throw Failure(TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME,
+                      "'" + computer + "' is the name of a controller of '" + domain + "'");
+    }
 }
 
 std::chrono::seconds CheckClock(SambaTools const& tools, std::string const& controller,

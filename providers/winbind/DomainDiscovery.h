@@ -31,6 +31,17 @@ ControllerAnswer FindController(SambaTools const& tools, std::string const& doma
                                 std::vector<std::string> const& preferred,
                                 Clock::time_point deadline);
 
+/// Whether an account with the NetBIOS name `computer` would be that of the controller that gave
+/// `answer`, or of one of the `others`, which are DNS names.
+bool IsNameOfController(std::string const& computer, ControllerAnswer const& answer,
+                        std::vector<std::string> const& others);
+
+/// Keeps a host from the name of a controller: Samba's `net` joins as any account that the user may
+/// change, and a controller whose secret is changed serves nobody any more.
+/// @throws Failure 1210
+void CheckHostName(std::string const& computer, ControllerAnswer const& answer,
+                   std::string const& domain);
+
 /// @throws Failure 1398 where the controller's clock and the host's are more apart than Kerberos
 ///         stands
 /// @return how far the controller's is ahead

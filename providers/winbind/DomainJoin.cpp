@@ -120,6 +120,7 @@ public:
             preferred.insert(preferred.begin(), first);
         }
         _controller = DomainDiscovery::FindController(_tools, _domain, preferred, _deadline);
+        DomainDiscovery::CheckHostName(_computer, _controller, _domain);
         auto const ahead = DomainDiscovery::CheckClock(_tools, _controller.controller, _deadline);
         _begin = GeneralizedTime(std::chrono::system_clock::now() + ahead - clockTolerance);
         _staging->Configure({_controller.Realm(), _controller.netBIOSDomain, _computer, {}},

@@ -73,6 +73,20 @@ TEST(DomainDiscoveryTest, PassesOverOtherRecordsAndNamesThatAreNoHosts) {
                 ElementsAre("dc"));
 }
 
+TEST(DomainDiscoveryTest, KnowsTheNamesOfControllers) {
+    ControllerAnswer answer;
+    answer.computer = "DC1";
+    std::vector<std::string> const others = {"dc1.corp.example", "dc2.corp.example",
+                                             "a-longer-name-than-fits.corp.example"};
+    for (char const* const name : {"DC1", "DC2", "A-LONGER-NAME-T"}) {
+        EXPECT_TRUE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
+    }
+    for (char const* const name : {"DC", "DC11", "DC2.CORP", "A-LONGER-NAME-TH"}) {
+        EXPECT_FALSE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
+    }
+    EXPECT_TRUE(DomainDiscovery::IsNameOfController("DC1", answer, {}));
+}
+
 TEST(DomainDiscoveryTest, SurvivesEveryCut) {
     std::string const whole = Message({Service(0, 2, Name({"dc1"})), Service(0, 1,
                                                                              "\x03"
