@@ -429,6 +429,8 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
     AddMembership(section, domain);
     // A controller that does not answer must not hold up questions for winbindd's whole minute.
     section.Add("winbind request timeout", "5");
+    // One that is back must not go unnoticed for half a minute.
+    section.Add("winbind reconnect delay", "5");
     // It works without: winbindd meets a trusted domain when it is asked for one of its users. With
     // it, all of winbindd waits while it looks for the controllers of those domains, which may be
     // silent, and everybody's log-in waits with it, root's too.
