@@ -63,8 +63,9 @@ def end_local(lab, when, attempts):
 def answers_in_time(lab, when, service, before):
     """The three timed questions. The trust state asks for the trusted domains first, and each of
     the two may take the timeout."""
-    for question, limit in (("configuration", TIMEOUT), ("trusted", TIMEOUT), ("state", 2 * TIMEOUT)):
-        with lab.step(f"{when}: the store answers '{question}' as before, within {limit} s") as step:
+    limits = {"configuration": TIMEOUT, "trusted": TIMEOUT, "state": 2 * TIMEOUT}
+    for question, limit in limits.items():
+        with lab.step(f"{when}: the store answers '{question}' as before in {limit} s") as step:
             answer, seconds = service.ask(question)
             step.took(seconds)
             expect_equal(answer, before[question], "the answer")
@@ -102,7 +103,7 @@ def recovers(lab, what, host, service, before, process):
     """Without a restart of anything on the host."""
     start = time.monotonic()
     user = "CORP\\user1"
-    with lab.step(f"{what}: tslauthctl info finds everything well, within {RECOVERY} s") as step:
+    with lab.step(f"{what}: tslauthctl info finds all well, within {RECOVERY} s") as step:
         until("exit code 0", lambda: host.run("tslauthctl", "info").code == 0, RECOVERY)
         step.took(time.monotonic() - start)
     with lab.step(f"{what}: {user} logs in again, within {RECOVERY} s") as step:
@@ -151,7 +152,7 @@ def frozen(lab, pool, host, service, before, entry):
                  for name in ("info", "dc other.example", "principal other.example",
                               "canonical plain1@corp.example")}
         answers_in_time(lab, "frozen", service, before)
-        with lab.step("frozen: asked again while the provider still waits, it answers at once") as step:
+        with lab.step("frozen: asked again while the provider waits, it answers at once") as step:
             answer, seconds = service.ask("state")
             step.took(seconds)
             expect_equal(answer, before["state"], "the trust state")
@@ -159,7 +160,7 @@ def frozen(lab, pool, host, service, before, entry):
         end_local(lab, "frozen", local)
         user_is_known(lab, "frozen", host, entry)
         tool_gives_up(lab, "frozen", tool.result())
-        with lab.step("frozen: the provider ends its wait, and the trust state is 2, no controller") as step:
+        with lab.step("frozen: the provider ends its wait: trust state 2, no controller") as step:
             until("trust state 2", lambda: service.ask("state")[0] == NO_CONTROLLER, QUESTION + 5)
         no_question_hangs(lab, host, asked)
         with lab.step("frozen: CORP\\user1 cannot be checked, and is refused") as step:

@@ -139,7 +139,8 @@ def is_refused(result, told, exit_code=REFUSED):
 
 
 def library_is_refused(result, told):
-    expect_equal((result.code, result.out), (1, f"{told[0]}: {told[1]}\n"), "what the library threw")
+    expect_equal((result.code, result.out), (1, f"{told[0]}: {told[1]}\n"),
+                 "what the library threw")
 
 
 def knows_no_domain(host):
@@ -154,7 +155,7 @@ def refusals(lab, host):
     """What does not lead to an account, and keeps the code where it is."""
     code = issue(lab.dc1, host)
     give(host, code)
-    with lab.step(f"{host.name}: no certificate is pinned: 0x80090325, and the code is not sent"):
+    with lab.step(f"{host.name}: no certificate is pinned: 0x80090325, no code is sent"):
         is_refused(join(host), UNTRUSTED)
         library_is_refused(host.library("join-cam", SERVER), UNTRUSTED)
         has_code(host, code)
@@ -163,12 +164,12 @@ def refusals(lab, host):
         is_refused(join(host), UNTRUSTED)
         library_is_refused(host.library("join-cam", SERVER), UNTRUSTED)
         has_code(host, code)
-    with lab.step(f"{host.name}: tslauthctl cam import pins the thumbprint that openssl prints"):
+    with lab.step(f"{host.name}: cam import pins the thumbprint that openssl prints"):
         pin(lab, host, "service")
         thumbprint = lab.dc1.ok("openssl", "x509", "-in", "/run/cam/service.pem", "-noout",
                                 "-fingerprint", "-sha1").out.strip().partition("=")[2]
         expect_equal(host.tslauthctl("cam", "list").out, f"{SERVER} {thumbprint}\n", "the list")
-    with lab.step(f"{host.name}: an impostor with another certificate: 0x80090325, and hears no code"):
+    with lab.step(f"{host.name}: an impostor's certificate: 0x80090325, it hears no code"):
         pin(lab, host, "service", IMPOSTOR)
         is_refused(join(host, server=IMPOSTOR), UNTRUSTED)
         heard = lab.dc2.read("/run/cam/heard")
@@ -186,7 +187,7 @@ def refusals(lab, host):
     with lab.step(f"{host.name}: an expired code is refused: code 5"):
         give(host, issue(lab.dc1, host, "--valid-for", "30", faketime="-31m"))
         is_refused(join(host), CODE_REFUSED)
-    with lab.step(f"{host.name}: it is joined to nothing, and the directory has no account of it"):
+    with lab.step(f"{host.name}: it is not joined, and the directory has no account"):
         knows_no_domain(host)
         expect_equal(lab.dc1.account_of(host), None, "the account")
 
@@ -197,7 +198,7 @@ def joins(lab, host, *options):
     give(host, code)
     with lab.step(f"{host.name}: tslauthctl join --cam {SERVER}"):
         host.tslauthctl("join", "--cam", SERVER, *options)
-    with lab.step(f"{host.name}: the code is gone from it, its account stands in Servers/Linux"):
+    with lab.step(f"{host.name}: the code is gone, the account stands in Servers/Linux"):
         host.exits(1, "test", "-e", CODE)
         expect_equal(lab.dc1.account_of(host, "cn")["dn"].lower(),
                      f"CN={host.name},{UNIT}".lower(), "the account's place")
@@ -215,7 +216,7 @@ def user_logs_in(lab, host):
 
 
 def code_counts_once(lab, host, code):
-    with lab.step(f"{host.name}: the same code again is refused: code 5, and the host stays joined"):
+    with lab.step(f"{host.name}: the same code again: code 5, and the host stays joined"):
         give(host, code)
         library_is_refused(host.library("join-cam", SERVER), CODE_REFUSED)
         host.shell("rm $1", CODE)
@@ -232,29 +233,30 @@ def code_of_another(lab, host, other):
 def chain(lab, host):
     """Nothing is pinned here: the certificate must be good by itself."""
     give(host, issue(lab.dc1, host))
-    with lab.step(f"{host.name}, verifying: an authority that it does not know: 0x80090325"):
+    with lab.step(f"{host.name}, verifying: an unknown authority: 0x80090325"):
         is_refused(join(host), UNTRUSTED)
     host.write(AUTHORITY, lab.dc1.read("/run/cam/ca.pem"))
     impostor = serve_as(lab.dc2, "service")
     try:
-        with lab.step(f"{host.name}, verifying: a good certificate of another address: 0x80090325"):
+        with lab.step(f"{host.name}, verifying: another address's certificate: 0x80090325"):
             is_refused(join(host, server=IMPOSTOR), UNTRUSTED)
     finally:
         stop(impostor)
-    with lab.step(f"{host.name}, verifying: a good certificate, and another one pinned: 0x80090325"):
+    with lab.step(f"{host.name}, verifying: another certificate pinned: 0x80090325"):
         pin(lab, host, "impostor")
         is_refused(join(host), UNTRUSTED)
     host.write("/etc/tessel/tslauth/camservers.conf", "")
 
 
 def no_credentials(lab, host, codes):
-    """Nothing in any file that the host can have written, and nothing that a process of it shows."""
+    """Not in any file that the host can have written, and not in what a process of it shows."""
     secrets = [SERVICE_PASSWORD, SERVICE_USER, PASSWORD]
     for code in codes:
         secrets += [code, code.replace("-", "")]
     with lab.step(f"{host.name}: no file of it and no process holds a password or a code"):
         found = host.run("grep", "-rlaF", "-f", "-", "/etc", "/run", "/var/lib/samba",
-                         "/var/cache/samba", "/var/log/samba", "/home", text="\n".join(secrets) + "\n")
+                         "/var/cache/samba", "/var/log/samba", "/home",
+                         text="\n".join(secrets) + "\n")
         expect_equal(found.out, "", "the files that hold one of them")
         seen = host.shell('cat /proc/[0-9]*/cmdline /proc/[0-9]*/environ 2>/dev/null || true').out
         expect(not any(secret in seen for secret in secrets), "a process shows one")
@@ -297,7 +299,7 @@ def stop(process):
 def play(lab):
     dc1 = lab.dc1
     pinning, verifying, bystander, patient = lab.hosts(4)
-    with lab.step("the service runs next to the controller, with a certificate of a private authority"):
+    with lab.step("the service runs next to the controller"):
         make_certificates(dc1)
         make_account(dc1)
         service = start_service(dc1)
@@ -320,7 +322,7 @@ def play(lab):
             no_credentials(lab, pinning, codes)
             no_credentials(lab, verifying, codes)
             service_says_nothing(lab, codes)
-            with lab.step("a server that takes the connection and says nothing: WSATimedOutException") as step:
+            with lab.step("a server that says nothing: WSATimedOutException") as step:
                 result = silence.result()
                 step.took(result.seconds)
                 library_is_refused(result, SILENT)
