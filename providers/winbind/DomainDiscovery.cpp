@@ -48,15 +48,20 @@ public:
         std::string const name = "_ldap._tcp.dc._msdcs." + domain + '.';
         std::vector<unsigned char> answer(NS_MAXMSG);
         int error = 0;
+        Clock::time_point silent;
+        Clock::time_point end;
         // A lost datagram costs a second. The longer wait is for a server that is not there at all:
         // the kernel needs three seconds to be sure of that.
         for (int const seconds : {1, 3}) {
             _state.retrans = seconds;
             _state.retry = 1;
+            // A server that says that it has failed leaves the same errors, only sooner.
+            silent = Clock::now() + std::chrono::seconds(seconds);
             errno = 0;
             int const length = ::res_nquery(&_state, name.c_str(), ns_c_in, ns_t_srv, answer.data(),
                                             static_cast<int>(answer.size()));
             error = errno;
+            end = Clock::now();
             if (length >= 0) {
                 auto const size = std::min(answer.size(), static_cast<std::size_t>(length));
                 return {answer.begin(), answer.begin() + static_cast<std::ptrdiff_t>(size)};
@@ -65,7 +70,7 @@ public:
                 break;
             }
         }
-        if (_state.res_h_errno == TRY_AGAIN && error == ETIMEDOUT) {
+        if (_state.res_h_errno == TRY_AGAIN && error == ETIMEDOUT && end >= silent) {
             throw Failure(TSLAUTH_PROVIDER_TIMED_OUT, "DNS does not answer for '" + name + "'");
         }
         throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,

@@ -207,12 +207,12 @@ JOINED = Attempt("host that is joined already", 2691, REFUSED)
 
 def joined_already(host):
     host.join()
-    # winbindd writes its databases while it runs.
-    host.shell("pkill -STOP -x winbindd")
+    # Samba's programs write their databases while they run.
+    host.shell("pkill -STOP 'winbindd|samba|rpcd'")
     try:
         return both_ways(host, JOINED)
     finally:
-        host.shell("pkill -CONT -x winbindd")
+        host.shell("pkill -CONT 'winbindd|samba|rpcd'")
 
 
 def silent_after_part(host):
