@@ -228,7 +228,9 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
                                    folders.pid, Paths::SambaLogs});
     changes.OnUndo([daemon, snapshot] {
         daemon.Stop(Clock::now() + stopLimit);
-        snapshot.RemoveNewFiles();
+        if (daemon.IsAlone()) { // what is new may be another server's otherwise
+            snapshot.RemoveNewFiles();
+        }
     });
     daemon.Restart(std::min(deadline, Clock::now() + daemonLimit));
     WinbindDaemon::CheckTrust(std::min(deadline, Clock::now() + trustLimit));

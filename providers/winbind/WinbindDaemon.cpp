@@ -108,6 +108,10 @@ bool WinbindDaemon::Runs() const {
     return Process(daemonProgram) != 0;
 }
 
+bool WinbindDaemon::IsAlone() const {
+    return Process("smbd") == 0 && Process("nmbd") == 0;
+}
+
 std::vector<pid_t> WinbindDaemon::Companions() const {
     bool const withServers = Process("smbd") == 0;
     std::vector<pid_t> found;

@@ -17,6 +17,8 @@ public:
     explicit WinbindDaemon(SambaFolders const& folders);
 
     bool Runs() const;
+    /// Whether no other server of Samba's writes to the same folders now.
+    bool IsAlone() const;
 
     /// Starts it, anew where it runs already, and waits until it answers.
     /// @throws Failure 1060 where it is not installed, 1062 where it does not answer by `deadline`
