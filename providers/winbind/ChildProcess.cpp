@@ -22,7 +22,7 @@ namespace tessel::winbind {
 
 namespace {
 
-constexpr std::size_t mostOutput = 1024 * 1024;
+constexpr std::size_t mostOutput = std::size_t(1024) * 1024;
 constexpr char searchPath[] = "PATH=/usr/sbin:/usr/bin:/sbin:/bin";
 constexpr char const* folders[] = {"/usr/sbin/", "/usr/bin/", "/sbin/", "/bin/"};
 /// How long the host waits beyond the deadline for the process between, which keeps it.
@@ -258,6 +258,7 @@ timespec Monotonic(Clock::time_point deadline) {
 
 std::vector<char*> Pointers(std::vector<std::string> const& texts) {
     std::vector<char*> pointers;
+    pointers.reserve(texts.size() + 1);
     for (std::string const& text : texts) {
         // execve(2) takes them so, and leaves them as they are.
         pointers.push_back(const_cast<char*>(text.c_str()));
@@ -318,7 +319,7 @@ std::string ChildProcess::Find(std::string const& program) {
         return ::access(program.c_str(), X_OK) == 0 ? program : std::string();
     }
     for (char const* const folder : folders) {
-        std::string const path = folder + program;
+        std::string path = folder + program;
         if (::access(path.c_str(), X_OK) == 0) {
             return path;
         }

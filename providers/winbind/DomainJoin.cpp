@@ -32,7 +32,7 @@ constexpr auto answerLimit = std::chrono::seconds(3);
 constexpr auto toolLimit = std::chrono::seconds(45);
 /// How much earlier than this join an account must have been made to be somebody else's work.
 constexpr auto clockTolerance = std::chrono::seconds(3);
-constexpr std::size_t longestBlob = 1024 * 1024;
+constexpr std::size_t longestBlob = std::size_t(1024) * 1024;
 constexpr std::size_t longestNetBIOSName = 15;
 
 Clock::time_point WorkDeadline() {

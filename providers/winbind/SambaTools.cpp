@@ -71,7 +71,7 @@ SambaFolders SambaFolders::Read(Clock::time_point deadline) {
     Append(task, {"testparm", "-s", "-v", FileExists(Paths::Samba) ? Paths::Samba : "/dev/null"});
     std::string const text = '\n' + RunToSuccess(task, deadline);
     auto const value = [&](char const* name) {
-        std::string const found = AfterLineStart(text, std::string("\t") + name + " = ");
+        std::string found = AfterLineStart(text, std::string("\t") + name + " = ");
         if (found.empty()) {
             throw Failure(SeeSystemLog, std::string("testparm does not print '") + name + "'");
         }

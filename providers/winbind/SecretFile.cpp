@@ -35,11 +35,12 @@ SecretFile::SecretFile(std::initializer_list<std::string_view> pieces)
         throw Failure(TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY,
                       "cannot make a file in memory: " + std::generic_category().message(error));
     }
-    if (_memory) {
-        // Best effort: the limit of locked memory is the host process's own.
-        (void)::mlock(_memory, _size);
-        (void)::madvise(_memory, _size, MADV_DONTDUMP);
+    if (!_memory) {
+        return;
     }
+    // Best effort: the limit of locked memory is the host process's own.
+    (void)::mlock(_memory, _size);
+    (void)::madvise(_memory, _size, MADV_DONTDUMP);
     char* end = _memory;
     for (std::string_view const piece : pieces) {
         if (!piece.empty()) {
