@@ -20,9 +20,11 @@
 #include <unistd.h>
 #include <vector>
 
-/// libwbclient takes the socket's folder from the environment in a program that exports this
-/// function: the name-service wrapper of Samba's own tests does.
+/// libwbclient takes the socket's folder from the environment in a program that exports the first of
+/// these, and a folder that is not root's in one that exports the second: the wrappers of Samba's own
+/// tests do.
 extern "C" __attribute__((visibility("default"))) bool nss_wrapper_enabled(); // NOLINT: its name
+extern "C" __attribute__((visibility("default"))) bool uid_wrapper_enabled(); // NOLINT: its name
 
 /// A winbindd that answers as it is told, for this program's libwbclient.
 class FakeWinbindd {

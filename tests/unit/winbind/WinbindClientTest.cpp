@@ -13,6 +13,9 @@ using namespace std::chrono_literals;
 bool nss_wrapper_enabled() {
     return true;
 }
+bool uid_wrapper_enabled() {
+    return true;
+}
 
 #if defined(__has_feature)
 #if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
