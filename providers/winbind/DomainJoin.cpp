@@ -106,7 +106,7 @@ public:
           _lock(_deadline) {
         RequireWinbindd();
         LocalMembership::CleanUp(_deadline);
-        LocalMembership::DissolveOpenJoin(_deadline);
+        LocalMembership::FinishOpenChange(_deadline);
         RequireNotJoined(_deadline);
         _staging.emplace();
         _staging->Configure(Guess(_domain, _computer), _domain, {});

@@ -119,13 +119,19 @@ void ThrowSystemFailure(std::string const& what, int error) {
 }
 
 std::optional<std::string> ReadHostFile(std::string const& path) {
-    int const file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    // Without waiting: the path may be a pipe, from which nothing ever comes.
+    int const file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
     if (file < 0) {
         int const error = errno;
         if (error == ENOENT || error == ENOTDIR) {
             return std::nullopt;
         }
         ThrowSystemFailure("cannot open '" + path + "'", error);
+    }
+    struct stat status = {};
+    if (::fstat(file, &status) != 0 || !S_ISREG(status.st_mode)) {
+        (void)::close(file); // nothing was read
+        throw Failure(SeeSystemLog, "'" + path + "' is not a regular file");
     }
     std::string text;
     int error = 0;

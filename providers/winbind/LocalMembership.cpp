@@ -158,17 +158,23 @@ bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
         (void)RunAll({[&] { daemon.Restart(Clock::now() + stopLimit); }});
     }
     return isWhole && RunAll({[] { RemoveHostFile(Paths::OwnSamba); },
-                              [] { RemoveHostFile(Paths::OpenJoin); }});
+                              [] { RemoveHostFile(Paths::OpenChange); }});
 }
 
 /// What an operation that was killed has left of a membership that smb.conf does not name.
-void FinishParting(SambaFolders const& folders) {
+void FinishParting(SambaFolders const& folders, Clock::time_point deadline) {
     auto const samba = ReadHostFile(Paths::Samba);
     bool const isNamed = samba && HasSambaInclude(*samba, Paths::OwnSamba);
     auto const left = Membership::ReadOwnFile();
     if (!isNamed && !left && !FileExists(Paths::OwnSamba) && !FileExists(Paths::OwnKerberos) &&
         !FileExists(BeforeJoinOf(folders))) {
         return;
+    }
+    if (!isNamed && !FileExists(Paths::OpenChange) && folders.isDomainMember &&
+        SambaTools().HasMachineSecret(deadline)) {
+        LogWarning(std::string("'") + Paths::Samba +
+                   "' was replaced, and the host joined, by other means");
+        return; // the secrets are not the provider's any more
     }
     LogWarning("cleaning up after a join or a part that did not end");
     if (isNamed) {
@@ -197,9 +203,10 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
     } else {
         made.insert(Made::Daemon);
     }
+    (void)changes.MakeFolder(FolderOf(Paths::Samba), 0755);
+    changes.Mark(Paths::OpenChange);
     ReplaceSecrets(folders, secrets, changes);
 
-    (void)changes.MakeFolder(FolderOf(Paths::Samba), 0755);
     if (changes.MakeFolder(Paths::OwnKerberosFolder, 0755)) {
         made.insert(Made::KerberosFolder);
     }
@@ -215,7 +222,6 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
     if (!samba) {
         made.insert(Made::SambaFile);
     }
-    changes.Mark(Paths::OpenJoin);
     changes.Replace(Paths::OwnSamba,
                     Membership::Record(made) +
                         SambaDomainText(domain.samba, AdministratorSettings(samba.value_or(""))),
@@ -238,6 +244,11 @@ void Establish(Domain const& domain, std::string const& secrets, HostChanges& ch
 
 void Dissolve(Membership const& membership, Clock::time_point deadline) {
     SambaFolders const folders = SambaFolders::Read(deadline);
+    {
+        HostChanges mark;
+        mark.Replace(Paths::OpenChange, "", 0600);
+        mark.Keep(); // it stays until all is done
+    }
     {
         HostChanges changes;
         if (!FileExists(BeforeJoinOf(folders))) {
@@ -267,18 +278,20 @@ void CleanUp(Clock::time_point deadline) {
     }
     // Again: the original of smb.conf may be that of a member.
     if (!Membership::Read()) {
-        FinishParting(folders);
-        RemoveHostFile(Paths::OpenJoin);
+        FinishParting(folders, deadline);
+        RemoveHostFile(Paths::OpenChange);
     }
     RemoveTemporaryFiles(files);
 }
 
-void DissolveOpenJoin(Clock::time_point deadline) {
-    if (!FileExists(Paths::OpenJoin)) {
+void FinishOpenChange(Clock::time_point deadline) {
+    if (!FileExists(Paths::OpenChange)) {
         return;
     }
     if (auto const membership = Membership::Read()) {
-        LogWarning("taking back a join that did not end; its account stays in the directory");
+        LogWarning(
+            "parting from a domain that a join or a part which did not end has left in half; "
+            "an account that is there stays in the directory");
         Dissolve(*membership, deadline);
     }
 }

@@ -31,9 +31,9 @@ void Dissolve(Membership const& membership, Clock::time_point deadline);
 /// of a part, the rest is done. To be called under the lock.
 void CleanUp(Clock::time_point deadline);
 
-/// Makes a host local again that a join which was killed has left between its first line in smb.conf
-/// and its end. A host that is joined, or not, stays as it is. To be called after `CleanUp`, where a
-/// part, which would delete the account as well, is not what is asked for.
-void DissolveOpenJoin(Clock::time_point deadline);
+/// Makes a host local again that a join or a part which was killed has left with a membership in half.
+/// A host that is joined, or not, stays as it is. To be called after `CleanUp`, where a part, which would
+/// delete the account as well, is not what is asked for.
+void FinishOpenChange(Clock::time_point deadline);
 
 } // namespace tessel::winbind::LocalMembership

@@ -13,9 +13,8 @@ inline constexpr char OwnSamba[] = "/etc/samba/tslauth.conf";
 inline constexpr char OwnKerberosFolder[] = "/etc/krb5.conf.d";
 inline constexpr char OwnKerberos[] = "/etc/krb5.conf.d/tslauth.conf";
 
-/// There from before smb.conf is changed to the end of a join: a host that has it was left by one that
-/// did not end, and is joined in half.
-inline constexpr char OpenJoin[] = "/etc/samba/tslauth.joining";
+/// There while a join or a part changes the host: who finds it knows of one that did not end.
+inline constexpr char OpenChange[] = "/etc/samba/tslauth.changing";
 
 /// What stays over joins and parts: `PreferredControllersKey`, the names with blanks between them.
 inline constexpr char State[] = "/etc/tessel/tslauth/winbind.conf";

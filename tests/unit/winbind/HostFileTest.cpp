@@ -35,6 +35,12 @@ TEST(HostFileTest, AFolderCannotBeRead) {
     EXPECT_THROW(ReadHostFile(folder.Path()), Failure);
 }
 
+TEST(HostFileTest, APipeIsNotWaitedFor) {
+    TemporaryFolder const folder;
+    ASSERT_EQ(0, ::mkfifo((folder / "pipe").c_str(), 0600));
+    EXPECT_THROW(ReadHostFile(folder / "pipe"), Failure);
+}
+
 TEST(HostFileTest, KeptChangesStayAndLeaveNothingBeside) {
     TemporaryFolder const folder;
     SetContents(folder / "old", "old");
