@@ -13,11 +13,11 @@
 #include "SambaTools.h"
 #include "StagingFolder.h"
 #include "SystemLog.h"
+#include "TextPieces.h"
 #include "tslauth_winbind_provider.h"
 
 #include <algorithm>
 #include <array>
-#include <cctype>
 #include <ctime>
 #include <optional>
 #include <strings.h>
@@ -25,6 +25,8 @@
 namespace tessel::winbind::DomainJoin {
 
 namespace {
+
+using TextPieces::Upper;
 
 /// Of the time for a join, what is kept for undoing it.
 constexpr auto undoTime = std::chrono::seconds(35);
@@ -37,13 +39,6 @@ constexpr std::size_t longestNetBIOSName = 15;
 
 Clock::time_point WorkDeadline() {
     return Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_JOIN_SECONDS) - undoTime;
-}
-
-std::string Upper(std::string text) {
-    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char c) {
-        return static_cast<char>(c < 0x80 ? std::toupper(c) : c);
-    });
-    return text;
 }
 
 /// What the tools need to know before a controller has told the rest.
