@@ -28,8 +28,10 @@ namespace {
 
 using TextPieces::Upper;
 
-/// Of the time for a join, what is kept for undoing it.
-constexpr auto undoTime = std::chrono::seconds(35);
+/// Of the time for a join, what is kept for undoing it: winbindd is stopped and started again, each
+/// of which may have to wait, and the account is deleted.
+constexpr auto undoTime = std::chrono::seconds(55);
+constexpr auto accountUndoTime = std::chrono::seconds(12);
 constexpr auto answerLimit = std::chrono::seconds(3);
 constexpr auto toolLimit = std::chrono::seconds(45);
 /// How much earlier than this join an account must have been made to be somebody else's work.
@@ -223,7 +225,7 @@ private:
     /// @return what stays there, or empty
     std::string LeftInDirectory(Account const& account) {
         std::string const name = "the account '" + _computer + "$'";
-        auto const deadline = Clock::now() + undoTime / 3;
+        auto const deadline = Clock::now() + accountUndoTime;
         try {
             std::string const made = _tools.ComputerAttribute(_controller.controller, _computer,
                                                               "whenCreated", account, deadline);

@@ -21,8 +21,9 @@ namespace tessel::winbind {
 
 namespace {
 
-/// Of the time for a part, what is kept for the host's half.
-constexpr auto localTime = std::chrono::seconds(30);
+/// Of the time for a part, what is kept for the host's half: winbindd is stopped, and started again
+/// where it ran before the join.
+constexpr auto localTime = std::chrono::seconds(60);
 /// How long a host without credentials waits for a controller before it goes without.
 constexpr auto ownAccountLimit = std::chrono::seconds(10);
 
@@ -76,7 +77,7 @@ void PartFromDomain(ActiveDirectoryClientCredentials const* credentials) {
                        "$' stays in the directory: " + e.what());
         }
     }
-    LocalMembership::Dissolve(*membership, Clock::now() + localTime / 2);
+    LocalMembership::Dissolve(*membership, Clock::now() + localTime / 4);
 }
 
 } // namespace tessel::winbind

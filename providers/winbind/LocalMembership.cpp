@@ -20,7 +20,7 @@ namespace tessel::winbind::LocalMembership {
 namespace {
 
 constexpr auto daemonLimit = std::chrono::seconds(20);
-constexpr auto trustLimit = std::chrono::seconds(20);
+constexpr auto trustLimit = std::chrono::seconds(30); // of a controller that others join as well
 constexpr auto stopLimit = std::chrono::seconds(10);
 
 using Made = Membership::Made;
