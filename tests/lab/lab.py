@@ -52,8 +52,8 @@ class Node:
             self.holder = file.read().strip()
 
     def command(self, *command):
-        return ["nsenter", "--target", self.holder, "--mount", "--uts", "--net", "--ipc", "--pid",
-                "--wdns=/", "--", *command]
+        return ["nsenter", "--target", self.holder, "--mount", "--root", "--uts", "--net",
+                "--ipc", "--pid", "--wdns=/", "--", *command]
 
     def run(self, *command, text=None, timeout=60):
         """Runs a command to its end, whatever that is. `text` is its standard input."""
