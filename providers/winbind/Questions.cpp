@@ -310,20 +310,9 @@ std::vector<Domain> GetTrustedDomains() {
     static LastAnswer<std::vector<Domain>>& last =
         *std::make_unique<LastAnswer<std::vector<Domain>>>().release(); // as long as any thread
     return last.Get(*own, [&] {
-        std::vector<Domain> domains = DomainsOf(AllTrusts(deadline));
         // A domain behind another one is nobody's trust in the directory, and known once it was met.
-        std::vector<Domain> remembered;
-        try {
-            remembered =
-                OtherDomains(WinbindClient(std::min(deadline, Clock::now() + pingTime)), *own);
-        } catch (Failure const& failure) {
-            // No user of any of them can log in then, which an answer would hide.
-            if (failure.Code() == TSLAUTH_PROVIDER_SERVICE_NOT_ACTIVE) {
-                throw;
-            }
-            LogWarning(std::string("trusted domains without those that winbindd has met: ") +
-                       failure.what());
-        }
+        std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
+        std::vector<Domain> domains = DomainsOf(AllTrusts(deadline));
         for (Domain const& domain : remembered) {
             if (!Contains(domains, domain)) {
                 domains.push_back(domain);
