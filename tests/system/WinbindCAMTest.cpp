@@ -701,6 +701,28 @@ TEST_F(WinbindCAMTest, RootIssuesCodesForAServiceThatIsNot) {
                      Sources + "/cam-service/tslauth-cam-service list-codes --state " + State()));
 }
 
+TEST_F(WinbindCAMTest, RootGivesTheServiceNoFileOfAnybodyElses) {
+    fs::create_directories(State());
+    ASSERT_EQ(0, chmod(State().c_str(), 0700));
+    ASSERT_EQ(0, chmod(_folder.Path().c_str(), 0711));
+    ASSERT_EQ(0, chown(State().c_str(), 65534, 65534));
+    struct stat before = {};
+    ASSERT_EQ(0, stat("/etc/shadow", &before));
+    for (std::string const name : {"lock", "codes.json"}) {
+        fs::create_symlink("/etc/shadow", State() + "/" + name);
+        EXPECT_THAT(Output("/usr/bin/python3 -B " + Sources +
+                           "/cam-service/tslauth-cam-service issue-code --state " + State() +
+                           " --host host01 2>&1; test $? = 1"),
+                    HasSubstr(name + " is not a regular file"));
+        struct stat after = {};
+        ASSERT_EQ(0, stat("/etc/shadow", &after));
+        EXPECT_EQ(before.st_uid, after.st_uid);
+        EXPECT_EQ(before.st_ino, after.st_ino);
+        EXPECT_EQ(before.st_ctim.tv_sec, after.st_ctim.tv_sec);
+        fs::remove(State() + "/" + name);
+    }
+}
+
 TEST_F(WinbindCAMTest, TheServiceKeepsItsSecretsFromOthers) {
     struct {
         std::string file;

@@ -3,12 +3,16 @@
 """What tslauth-cam-service decides: codes, units, refusals. Nothing here opens a connection."""
 
 import concurrent.futures
+import contextlib
 import importlib.machinery
 import importlib.util
+import io
 import json
 import os
 import pathlib
 import re
+import subprocess
+import sys
 import tempfile
 import time
 import unittest
@@ -102,8 +106,8 @@ class Codes(Folder):
         self.assertEqual({"codes.json", "lock"}, {path.name for path in self.folder.iterdir()})
 
     def test_the_same_code_has_another_digest_each_time(self):
-        self.assertNotEqual(service.digest(b"1" * 16, "a", "X"), service.digest(b"2" * 16, "a", "X"))
-        self.assertNotEqual(service.digest(b"1" * 16, "a", "X"), service.digest(b"1" * 16, "b", "X"))
+        digests = {service.digest(salt * 16, host, "X") for salt in (b"1", b"2") for host in "ab"}
+        self.assertEqual(4, len(digests))
 
     def test_one_of_many_that_take_a_code_at_once_gets_it(self):
         code = self.codes.issue("host01", None, 60, False)
@@ -130,6 +134,74 @@ class Codes(Folder):
         self.assertEqual({"codes.json", "lock"}, {path.name for path in self.folder.iterdir()})
 
 
+class State(Folder):
+    """What lies in the folder need not be what this program left there."""
+
+    def broken(self, reason):
+        for call in (self.codes.list, lambda: self.codes.issue("host01", None, 60, False),
+                     lambda: self.codes.revoke("host01"),
+                     lambda: self.codes.take("host01", "X", anything)):
+            with self.assertRaisesRegex(service.BrokenState, reason):
+                call()
+
+    def test_no_file_is_reached_through_a_link(self):
+        outside = self.folder / "outside"
+        for name in ("lock", "codes.json"):
+            for link in (os.symlink, os.link):
+                outside.write_text('{"version": 1, "codes": {}}')
+                before = outside.stat()
+                link(outside, self.folder / name)
+                self.broken(f"{name} is not a regular file")
+                self.assertEqual((before.st_uid, before.st_mode, before.st_mtime_ns),
+                                 (lambda s: (s.st_uid, s.st_mode, s.st_mtime_ns))(outside.stat()))
+                (self.folder / name).unlink()
+
+    def test_a_link_to_nothing_makes_no_file(self):
+        (self.folder / "lock").symlink_to(self.folder / "elsewhere")
+        self.broken("lock is not a regular file")
+        self.assertFalse((self.folder / "elsewhere").exists())
+
+    def test_a_folder_or_a_fifo_is_refused_and_not_waited_for(self):
+        for name in ("lock", "codes.json"):
+            for make in (os.mkfifo, os.mkdir):
+                make(self.folder / name)
+                self.broken(f"{name} is not a regular file")
+                (os.rmdir if make is os.mkdir else os.unlink)(self.folder / name)
+
+    def test_a_damaged_file_is_named_and_kept(self):
+        self.codes.issue("host01", None, 60, False)
+        file = self.folder / "codes.json"
+        right = file.read_text()
+        entry = json.loads(right)["codes"]["HOST01"]
+        damaged = ["", "{", "[]", "{}", '{"version": 1}', '{"version": 1, "codes": []}', "[" * 9999,
+                   right.replace('"version": 1', '"version": 2'), right[:-9], "\0" * 64]
+        for member, values in {"salt": (None, "", "x", 1), "digest": ("", "0", None),
+                               "unit": (1, []), "expires": (None, "1", 1.5, True),
+                               "reuse": (None, 0, "")}.items():
+            damaged += [json.dumps({"version": 1, "codes": {"HOST01": {**entry, member: value}}})
+                        for value in values]
+            damaged.append(json.dumps({"version": 1, "codes": {
+                "HOST01": {key: entry[key] for key in entry if key != member}}}))
+        for text in damaged:
+            file.write_text(text)
+            self.broken(r"codes\.json is damaged and was left as it is: .*; repair it")
+            self.assertEqual(text, file.read_text())
+        file.write_bytes(b"\xff")
+        self.broken("codes.json is damaged")
+        file.write_text(right)
+        self.assertEqual(["HOST01"], list(self.codes.list()))
+
+    def test_root_becomes_the_owner_of_the_folder(self):
+        calls = mock.Mock()
+        with mock.patch.multiple(service.os, geteuid=lambda: 0, setgroups=calls.setgroups,
+                                 setresgid=calls.setresgid, setresuid=calls.setresuid):
+            service.become(mock.Mock(st_uid=0, st_gid=0))
+            self.assertEqual([], calls.mock_calls)
+            service.become(mock.Mock(st_uid=7, st_gid=8))
+        self.assertEqual([mock.call.setgroups([]), mock.call.setresgid(8, 8, 8),
+                          mock.call.setresuid(7, 7, 7)], calls.mock_calls)
+
+
 class Units(unittest.TestCase):
     def test_a_path_runs_from_the_outside_in(self):
         self.assertEqual("OU=Linux,OU=Servers,DC=corp,DC=example",
@@ -150,8 +222,8 @@ class Units(unittest.TestCase):
 
     def test_what_is_no_unit_of_the_domain_is_refused(self):
         for text in ("", "/", "A//B", "A/ /B", "OU=A,X=B", "OU=", "OU=A,DC=other,DC=example",
-                     "DC=corp,DC=example", "OU=A,DC=corp,DC=example,OU=B", "A\nB", "A\0", "A" * 2000,
-                     "OU=A,,OU=B"):
+                     "DC=corp,DC=example", "OU=A,DC=corp,DC=example,OU=B", "A\nB", "A\0",
+                     "A" * 2000, "OU=A,,OU=B"):
             with self.assertRaises(ValueError, msg=text):
                 service.unit_name(text, DOMAIN)
 
@@ -330,13 +402,46 @@ class Requests(Folder):
     def test_a_broken_file_of_codes_is_no_refusal(self):
         (self.folder / "codes.json").write_text("{")
         self.assertEqual(("failed", False), self.error(self.account("X")))
+        self.assertIn("codes.json is damaged", self.log[0])
 
 
-class Log(unittest.TestCase):
+class Log(Folder):
     def test_a_line_stays_one_line(self):
         with mock.patch("builtins.print") as printed, mock.patch.object(service.syslog, "syslog"):
             service.log(0, "a\nb\x1b[0m\u202e")
         self.assertEqual("a?b?[0m?", printed.call_args[0][0])
+
+    def test_no_stdout_makes_it_fail(self):
+        closed = io.StringIO()
+        closed.close()
+        with open("/dev/full", "w") as full, open(os.devnull) as unwritable:
+            for stdout in (io.TextIOWrapper(io.BytesIO(), encoding="ascii"), closed, full,
+                           unwritable, None):
+                with mock.patch.object(service.sys, "stdout", stdout), \
+                        mock.patch.object(service.syslog, "syslog") as syslog:
+                    service.log(0, "Büro \udcff")
+                syslog.assert_called_once_with(0, "Büro ?")
+            with contextlib.suppress(OSError):
+                full.close()
+
+    def test_an_answer_is_not_lost_where_it_cannot_be_logged(self):
+        code = self.codes.issue("host01", "Büro", 60, False)
+        asked = service.Service(self.codes, FakeDomain(), None)
+        request = {"version": 1, "request": "account", "account": "host01"}
+        stdout = io.TextIOWrapper(io.BytesIO(), encoding="ascii")
+        with mock.patch.object(service.sys, "stdout", stdout), \
+                mock.patch.object(service.syslog, "syslog"):
+            self.assertEqual("QkxPQg==", asked.answer("192.0.2.1", json.dumps(request), code)[1])
+
+    def test_the_program_says_what_the_stdout_has_no_letters_for(self):
+        with tempfile.TemporaryDirectory() as folder:
+            run = [sys.executable, "-B", PROGRAM]
+            environment = {**os.environ, "PYTHONIOENCODING": "ascii", "PYTHONUTF8": "0"}
+            subprocess.run([*run, "issue-code", "--state", folder, "--host", "h", "--unit", "Büro"],
+                           check=True, capture_output=True, env=environment)
+            listed = subprocess.run([*run, "list-codes", "--state", folder], check=True, text=True,
+                                    capture_output=True, env=environment).stdout
+        self.assertRegex(listed, r"^H\tB\\xfcro\t60 min\n$")
 
 
 if __name__ == "__main__":
