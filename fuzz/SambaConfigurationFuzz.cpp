@@ -4,7 +4,8 @@
 /// the provider's.
 #include "Expect.h"
 
-#include "SambaConfiguration.h"
+#include "text/SambaDomain.h"
+#include "text/SambaInclude.h"
 
 #include <cstddef>
 #include <cstdint>

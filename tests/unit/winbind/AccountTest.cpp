@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "Account.h"
+#include "samba/Account.h"
 
 #include "Failure.h"
 

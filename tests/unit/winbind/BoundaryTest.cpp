@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "Boundary.h"
+#include "record/Boundary.h"
 #include "Failure.h"
 
 #include <gtest/gtest.h>

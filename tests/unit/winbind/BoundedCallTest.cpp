@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "BoundedCall.h"
+#include "samba/BoundedCall.h"
 #include "Failure.h"
 
 #include <gtest/gtest.h>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "ChildProcess.h"
+#include "host/ChildProcess.h"
 
 #include "../../TemporaryFolder.h"
 #include "Failure.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "ControllerAnswer.h"
+#include "text/ControllerAnswer.h"
 
 #include "Failure.h"
 #include "GoldenText.h"

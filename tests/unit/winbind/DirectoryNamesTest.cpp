@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "DirectoryNames.h"
+#include "text/DirectoryNames.h"
 
 #include "Failure.h"
 

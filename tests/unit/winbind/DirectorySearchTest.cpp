@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "DirectorySearch.h"
+#include "samba/DirectorySearch.h"
 
 #include <gtest/gtest.h>
 

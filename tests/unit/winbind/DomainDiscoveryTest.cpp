@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "DomainDiscovery.h"
+#include "samba/DomainDiscovery.h"
 
 #include "Failure.h"
 

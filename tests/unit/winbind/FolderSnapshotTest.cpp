@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "FolderSnapshot.h"
+#include "host/FolderSnapshot.h"
 
 #include "../../TemporaryFolder.h"
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "HostFile.h"
+#include "host/HostFile.h"
 
 #include "../../TemporaryFolder.h"
 #include "Failure.h"

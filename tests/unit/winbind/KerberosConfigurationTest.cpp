@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "KerberosConfiguration.h"
+#include "text/KerberosConfiguration.h"
 
 #include "Failure.h"
 #include "GoldenText.h"

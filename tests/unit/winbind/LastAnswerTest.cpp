@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "LastAnswer.h"
+#include "questions/LastAnswer.h"
 
 #include <gtest/gtest.h>
 

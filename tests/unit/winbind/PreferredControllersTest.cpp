@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "PreferredControllers.h"
+#include "host/PreferredControllers.h"
 
 #include "../../TemporaryFolder.h"
 #include "Failure.h"

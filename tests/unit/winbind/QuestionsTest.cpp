@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "Questions.h"
+#include "questions/Questions.h"
 #include "tslauth_winbind_provider.h"
 
 #include <gtest/gtest.h>

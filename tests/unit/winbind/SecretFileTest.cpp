@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "SecretFile.h"
+#include "host/SecretFile.h"
 
 #include <gmock/gmock.h>
 #include <string>

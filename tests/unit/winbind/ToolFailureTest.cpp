@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "ToolFailure.h"
+#include "text/ToolFailure.h"
 
 #include "../../MappedCodes.h"
 #include "GoldenText.h"

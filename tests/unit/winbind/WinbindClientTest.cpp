@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "WinbindClient.h"
+#include "samba/WinbindClient.h"
 #include "Failure.h"
 #include "FakeWinbindd.h"
 

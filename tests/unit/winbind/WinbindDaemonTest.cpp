@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "WinbindDaemon.h"
+#include "samba/WinbindDaemon.h"
 
 #include "../../TemporaryFolder.h"
-#include "SambaTools.h"
+#include "samba/SambaTools.h"
 
 #include <csignal>
 #include <cstdlib>

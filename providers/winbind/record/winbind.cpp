@@ -1,0 +1,147 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Failure.h"
+#include "questions/Directory.h"
+#include "questions/LastAnswer.h"
+#include "questions/Questions.h"
+#include "record/Boundary.h"
+#include "tslauth_winbind_provider.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+using namespace tessel::winbind;
+
+namespace {
+
+std::string TextOrEmpty(char const* text) {
+    return text == nullptr ? std::string() : std::string(text);
+}
+
+void RequireBoth(ActiveDirectoryClientCredentials const& credentials) {
+    if (credentials.userName == nullptr || credentials.password == nullptr) {
+        throw Failure(TSLAUTH_PROVIDER_INVALID_PARAMETER, "no user name or no password");
+    }
+}
+
+} // namespace
+
+// The record's entries. What they promise stands in tslauth_provider.h, what their numbers mean in
+// tslauth_winbind_provider.h.
+extern "C" {
+
+static int JoinDomainEntry(char const* domain, char const* organisationalUnit,
+                           ActiveDirectoryClientCredentials const* credentials) {
+    return CodeOf("join domain", [&] {
+        RequireBoth(*credentials);
+        JoinDomain(domain, TextOrEmpty(organisationalUnit), *credentials);
+    });
+}
+
+static int PartDomainEntry(ActiveDirectoryClientCredentials const* credentials) {
+    return CodeOf("part domain", [&] {
+        if (credentials != nullptr) {
+            RequireBoth(*credentials);
+        }
+        PartDomain(credentials);
+    });
+}
+
+static int GetActiveDomainEntry(ActiveDirectoryClientDomain* domain,
+                                ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get active domain", [&] { HandOut(GetActiveDomain(), domain, release); });
+}
+
+static int SetPreferredDomainControllersEntry(char const** controllers) {
+    return CodeOf("set preferred domain controllers", [&] {
+        std::vector<std::string> names;
+        for (char const* const* name = controllers; *name != nullptr; ++name) {
+            names.emplace_back(*name);
+        }
+        SetPreferredDomainControllers(names);
+    });
+}
+
+static int GetPreferredDomainControllersEntry(char*** controllers,
+                                              ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get preferred domain controllers",
+                  [&] { HandOut(GetPreferredDomainControllers(), controllers, release); });
+}
+
+static int GetDomainTrustStateEntry() {
+    return ValueOf("get domain trust state", TSLAUTH_WINBIND_TRUST_UNKNOWN,
+                   [] { return GetDomainTrustState(); });
+}
+
+static int GetTrustedDomainsEntry(ActiveDirectoryClientDomain*** domains,
+                                  ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get trusted domains", [&] { HandOut(GetTrustedDomains(), domains, release); });
+}
+
+static int GetMachineAccountDNEntry(char** name, ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get machine account DN", [&] {
+        static LastAnswer<std::string>& last =
+            *std::make_unique<LastAnswer<std::string>>().release(); // as long as any thread
+        HandOut(last.Get(GetActiveDomain(), [] { return GetMachineAccountDN(); }), name, release);
+    });
+}
+
+static int GetAnyDomainControllerEntry(char const* first, char const* domain, char** controller,
+                                       ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get any domain controller", [&] {
+        HandOut(GetAnyDomainController(TextOrEmpty(first), domain), controller, release);
+    });
+}
+
+static int ConvertCanonicalUsernameEntry(char const* name, char** canonicalName,
+                                         ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("convert canonical user name",
+                  [&] { HandOut(ConvertCanonicalUsername(name), canonicalName, release); });
+}
+
+static int
+JoinDomainWithMachineAccountEntry(ActiveDirectoryClientDomainInformation const* domainInformation,
+                                  ActiveDirectoryClientMachineAccount const* account) {
+    return CodeOf("join domain with machine account",
+                  [&] { JoinDomainWithMachineAccount(*domainInformation, *account); });
+}
+
+static int GetHostPrincipalForDomainEntry(char const* domain, char** principal,
+                                          ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("get host principal for domain",
+                  [&] { HandOut(GetHostPrincipalForDomain(domain), principal, release); });
+}
+
+static int GetDomainTrustRelationshipEntry(char const* domain) {
+    return ValueOf("get domain trust relationship", 0,
+                   [&] { return GetDomainTrustRelationship(domain); });
+}
+
+ActiveDirectoryClientMetadataRecord const ActiveDirectoryClientMetadata = {
+    TSLAUTH_PROVIDER_API_VERSION,
+    "pam_winbind.so",
+    // README.md says why each of them.
+    "try_first_pass",
+    "winbind",
+    nullptr,
+};
+
+ActiveDirectoryClientOperationsRecord const ActiveDirectoryClientOperations = {
+    TSLAUTH_PROVIDER_API_VERSION,
+    &JoinDomainEntry,
+    &PartDomainEntry,
+    &GetActiveDomainEntry,
+    &SetPreferredDomainControllersEntry,
+    &GetPreferredDomainControllersEntry,
+    nullptr,
+    &GetDomainTrustStateEntry,
+    &GetTrustedDomainsEntry,
+    &GetMachineAccountDNEntry,
+    &GetAnyDomainControllerEntry,
+    &ConvertCanonicalUsernameEntry,
+    &JoinDomainWithMachineAccountEntry,
+    &GetHostPrincipalForDomainEntry,
+    &GetDomainTrustRelationshipEntry,
+};
+
+} // extern "C"

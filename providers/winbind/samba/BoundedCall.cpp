@@ -1,0 +1,169 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "samba/BoundedCall.h"
+
+#include "Failure.h"
+
+#include <tslauth/Exception.h>
+#include <tslauth/TslauthThreadUtil.h>
+
+#include <condition_variable>
+#include <csignal>
+#include <exception>
+#include <mutex>
+#include <new>
+#include <pthread.h>
+#include <utility>
+
+namespace tessel::winbind {
+
+namespace {
+
+/// The threads of this process. Nothing here is ever destroyed: an abandoned call may end while the
+/// process exits.
+struct Threads {
+    std::mutex lock;                 // guards the numbers, and the members of every call
+    std::condition_variable changed; // one of the numbers
+    unsigned running = 0;
+    unsigned abandoned = 0; // of those running
+};
+
+extern "C" void LockThreads();
+extern "C" void UnlockThreads();
+extern "C" void ForgetThreads();
+
+Threads& AllThreads() {
+    static Threads& threads = []() -> Threads& {
+        (void)pthread_atfork(&LockThreads, &UnlockThreads, &ForgetThreads); // without memory: as is
+        return *std::make_unique<Threads>().release();
+    }();
+    return threads;
+}
+
+extern "C" void LockThreads() {
+    AllThreads().lock.lock();
+}
+
+extern "C" void UnlockThreads() {
+    AllThreads().lock.unlock();
+}
+
+/// In a child, which has none of its parent's threads, and where this one holds the lock.
+extern "C" void ForgetThreads() {
+    Threads& threads = AllThreads();
+    threads.running = 0;
+    threads.abandoned = 0;
+    new (&threads.changed) std::condition_variable; // nobody waits for the old one any more
+    threads.lock.unlock();
+}
+
+/// One call, owned by its caller and by its thread.
+struct Call {
+    std::function<void()> function;
+    std::condition_variable ended;
+    bool hasEnded = false;
+    bool isAbandoned = false;
+    std::exception_ptr failure;
+};
+
+void RunCall(std::shared_ptr<Call> call) {
+    std::exception_ptr failure;
+    try {
+        call->function();
+    } catch (...) {
+        failure = std::current_exception();
+    }
+    // What it holds goes before its caller is told, who may be waiting to see that gone.
+    call->function = nullptr;
+
+    Threads& threads = AllThreads();
+    std::lock_guard<std::mutex> const guard(threads.lock);
+    call->failure = std::move(failure);
+    call->hasEnded = true;
+    call->ended.notify_all();
+    --threads.running;
+    if (call->isAbandoned) {
+        --threads.abandoned;
+    }
+    threads.changed.notify_all();
+}
+
+/// Keeps every signal off the threads that are made meanwhile: the host's handlers belong to the
+/// host's threads, and libwbclient takes an interrupted wait for a winbindd that is gone.
+class SignalsBlocked {
+public:
+    SignalsBlocked() {
+        sigset_t all;
+        (void)sigfillset(&all); // these three cannot fail with valid arguments
+        (void)pthread_sigmask(SIG_SETMASK, &all, &_before);
+    }
+    SignalsBlocked(SignalsBlocked const&) = delete;
+    SignalsBlocked& operator=(SignalsBlocked const&) = delete;
+    ~SignalsBlocked() {
+        (void)pthread_sigmask(SIG_SETMASK, &_before, nullptr);
+    }
+
+private:
+    sigset_t _before;
+};
+
+Failure TimedOut(std::string const& what) {
+    return {TSLAUTH_PROVIDER_TIMED_OUT, what + ": no answer in time"};
+}
+
+} // namespace
+
+void BoundedCall::Wait(std::string const& what, Clock::time_point deadline,
+                       std::function<void()> function) {
+    auto const call = std::make_shared<Call>();
+    call->function = std::move(function);
+
+    Threads& threads = AllThreads();
+    std::unique_lock<std::mutex> lock(threads.lock);
+    if (Clock::now() >= deadline) {
+        throw TimedOut(what);
+    }
+    while (threads.running >= MaximumThreads) {
+        if (threads.abandoned >= MaximumThreads) {
+            throw Failure(TSLAUTH_PROVIDER_TIMED_OUT,
+                          what + ": all of " + std::to_string(MaximumThreads) +
+                              " earlier questions still wait for an answer");
+        }
+        if (threads.changed.wait_until(lock, deadline) == std::cv_status::timeout &&
+            threads.running >= MaximumThreads) {
+            throw TimedOut(what);
+        }
+    }
+    ++threads.running;
+    lock.unlock();
+    try {
+        SignalsBlocked const blocked;
+        authentication::TslauthThreadUtil::ScheduleThread([call] { RunCall(call); });
+    } catch (std::exception const& e) {
+        lock.lock();
+        --threads.running;
+        threads.changed.notify_all();
+        throw Failure(TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY, what + ": " + e.what());
+    }
+
+    lock.lock();
+    if (!call->ended.wait_until(lock, deadline, [&] { return call->hasEnded; })) {
+        call->isAbandoned = true;
+        ++threads.abandoned;
+        threads.changed.notify_all();
+        throw TimedOut(what);
+    }
+    // Its only owner from now on: the thread may still be about to let go of the call.
+    std::exception_ptr const failure = std::exchange(call->failure, nullptr);
+    lock.unlock();
+    if (failure) {
+        std::rethrow_exception(failure);
+    }
+}
+
+unsigned BoundedCall::Abandoned() {
+    Threads& threads = AllThreads();
+    std::lock_guard<std::mutex> const guard(threads.lock);
+    return threads.abandoned;
+}
+
+} // namespace tessel::winbind

@@ -1,0 +1,76 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "host/ChildProcess.h"
+#include "samba/Account.h"
+#include "text/ControllerAnswer.h"
+
+#include <chrono>
+#include <optional>
+#include <string>
+
+namespace tessel::winbind {
+
+class StagingFolder;
+
+/// The folders in which the Samba of this host keeps its files.
+struct SambaFolders {
+    std::string secrets; ///< "private dir"
+    std::string state;
+    std::string cache;
+    std::string lock;
+    std::string pid;
+    /// The host's role, as `server role` and `security` together make it.
+    bool isDomainMember = false;
+    bool isDomainController = false;
+
+    /// As Samba itself resolves them from the host's smb.conf, or without it where there is none.
+    /// @throws Failure also where Samba cannot read its file
+    static SambaFolders Read(Clock::time_point deadline);
+};
+
+/// Samba's `net`, with the configuration of a staging folder or the host's own. Every call runs it
+/// once, ends it at the deadline (`Failure` 10060), and throws a `Failure` with the code that its
+/// text stands for. A value, for any number of threads.
+class SambaTools {
+public:
+    /// With the host's configuration.
+    SambaTools() = default;
+
+    explicit SambaTools(StagingFolder const& staging);
+
+    /// What a controller says of itself; one datagram each way, and no account.
+    ControllerAnswer Lookup(std::string const& controller, Clock::time_point deadline) const;
+
+    /// How far the controller's clock is ahead; nothing where it does not say. No account.
+    std::optional<std::chrono::seconds> ClockOffset(std::string const& controller,
+                                                    Clock::time_point deadline) const;
+
+    /// @param unit a distinguished name, or empty: where the domain puts new computers
+    void Join(std::string const& controller, Account const& account, std::string const& unit,
+              Clock::time_point deadline) const;
+
+    /// Takes the membership from the text of an offline join. Asks nobody.
+    void JoinOffline(SecretFile const& blob, Clock::time_point deadline) const;
+
+    /// Deletes the host's account and its secrets.
+    /// @param account null: the host's own
+    void Leave(std::string const& controller, Account const* account,
+               Clock::time_point deadline) const;
+
+    /// The first value of an attribute of a computer; empty where it has none, or does not exist.
+    std::string ComputerAttribute(std::string const& controller, std::string const& computer,
+                                  std::string const& attribute, Account const& account,
+                                  Clock::time_point deadline) const;
+
+    /// Whether the secrets hold those of a domain's member. Asks nobody.
+    bool HasMachineSecret(Clock::time_point deadline) const;
+
+private:
+    ChildProcess::Task Task() const;
+
+    std::string _configuration; ///< empty: the host's, here and below
+    std::string _kerberosConfiguration;
+};
+
+} // namespace tessel::winbind
