@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "Host.h"
-#include "Verbs.h"
+#include "analysis/Host.h"
+#include "verbs/Verbs.h"
 
 #if defined(__GNUC__)
 #pragma GCC diagnostic push
@@ -69,19 +69,19 @@ public:
         AddCommon(_app, arguments);
 
         Add("stores", "List the stores; the active one has a star", arguments,
-            [](Output& output) { return RunStores(output); });
+            [](Console& console) { return RunStores(console); });
         Add("status", "Say which store is recorded and whether the host agrees with it", arguments,
-            [](Output& output) { return RunStatus(output); });
+            [](Console& console) { return RunStatus(console); });
 
         auto* plan = Add("plan", "Show what 'activate' would write, and change nothing", arguments,
-                         [&](Output& output) { return RunPlan(arguments.store, output); });
+                         [&](Console& console) { return RunPlan(arguments.store, console); });
         plan->add_option("store", arguments.store, "Display name of a store")
             ->required()
             ->type_name("NAME");
 
         auto* activate =
-            Add("activate", "Make a store the active one", arguments, [&](Output& output) {
-                return RunActivate(arguments.store, arguments.acceptLoss, output);
+            Add("activate", "Make a store the active one", arguments, [&](Console& console) {
+                return RunActivate(arguments.store, arguments.acceptLoss, console);
             });
         activate->add_option("store", arguments.store, "Display name of a store")
             ->required()
@@ -91,8 +91,8 @@ public:
 
         auto* prepare =
             Add("prepare", "Show the smallest edit that lets the library carry the files",
-                arguments, [&](Output& output) {
-                    return RunPrepare(arguments.write, arguments.acceptLoss, output);
+                arguments, [&](Console& console) {
+                    return RunPrepare(arguments.write, arguments.acceptLoss, console);
                 });
         prepare->add_flag("--write", arguments.write, "Make the edit; the original is kept beside");
         prepare->add_flag("--accept-loss", arguments.acceptLoss,
@@ -104,8 +104,8 @@ public:
     }
 
     /// @return the command to run; empty where `exitCode` is how it ends
-    std::function<ExitCode(Output&)> Parse(int argc, char** argv, int& exitCode,
-                                           std::string& error) {
+    std::function<ExitCode(Console&)> Parse(int argc, char** argv, int& exitCode,
+                                            std::string& error) {
         try {
             _app.parse(argc, argv);
         } catch (CLI::Success const& e) {
@@ -157,8 +157,8 @@ private:
 
     void AddMembership(Arguments& arguments) {
         auto* join =
-            AddAsking(_app, "join", "Join the host to a domain", arguments, [&](Output& output) {
-                return RunJoin(arguments.join, arguments.limit, output);
+            AddAsking(_app, "join", "Join the host to a domain", arguments, [&](Console& console) {
+                return RunJoin(arguments.join, arguments.limit, console);
             });
         join->add_option("domain", arguments.join.domain,
                          "The domain, and where its machine account is made")
@@ -174,40 +174,43 @@ private:
         AddAccount(*join, arguments.join.account);
 
         auto* part = AddAsking(_app, "part", "Part the host from its domain", arguments,
-                               [&](Output& output) {
-                                   return RunPart(arguments.join.account, arguments.limit, output);
+                               [&](Console& console) {
+                                   return RunPart(arguments.join.account, arguments.limit, console);
                                });
         AddAccount(*part, arguments.join.account);
     }
 
     void AddQuestions(Arguments& arguments) {
         AddAsking(_app, "info", "Tell about the host's domain, the domains it trusts and the trust",
-                  arguments, [&](Output& output) { return RunInfo(arguments.limit, output); });
+                  arguments, [&](Console& console) { return RunInfo(arguments.limit, console); });
         auto* dc =
-            AddAsking(_app, "dc", "Name a domain controller", arguments, [&](Output& output) {
-                return RunDC(arguments.name, arguments.limit, output);
+            AddAsking(_app, "dc", "Name a domain controller", arguments, [&](Console& console) {
+                return RunDC(arguments.name, arguments.limit, console);
             });
-        auto* principal = AddAsking(
-            _app, "principal", "Name the host's principal in a domain", arguments,
-            [&](Output& output) { return RunPrincipal(arguments.name, arguments.limit, output); });
+        auto* principal =
+            AddAsking(_app, "principal", "Name the host's principal in a domain", arguments,
+                      [&](Console& console) {
+                          return RunPrincipal(arguments.name, arguments.limit, console);
+                      });
         for (auto* command : {dc, principal}) {
             command->add_option("domain", arguments.name, "The domain; the host's own if left out")
                 ->check(NotEmpty)
                 ->type_name("DOMAIN");
         }
-        AddAsking(
-            _app, "canonical", "Tell under which name the host knows a user", arguments,
-            [&](Output& output) { return RunCanonical(arguments.name, arguments.limit, output); })
+        AddAsking(_app, "canonical", "Tell under which name the host knows a user", arguments,
+                  [&](Console& console) {
+                      return RunCanonical(arguments.name, arguments.limit, console);
+                  })
             ->add_option("name", arguments.name, "A user's name")
             ->required()
             ->type_name("NAME");
 
         auto* preferred = AddAsking(
             _app, "preferred-dcs", "List the domain controllers that are asked first", arguments,
-            [&](Output& output) { return RunPreferredDCs(arguments.limit, output); });
+            [&](Console& console) { return RunPreferredDCs(arguments.limit, console); });
         preferred->require_subcommand(0, 1);
-        auto const set = [&](Output& output) {
-            return RunSetPreferredDCs(arguments.names, arguments.limit, output);
+        auto const set = [&](Console& console) {
+            return RunSetPreferredDCs(arguments.names, arguments.limit, console);
         };
         AddAsking(*preferred, "set", "Set them, in this order", arguments, set)
             ->add_option("names", arguments.names, "Names of domain controllers")
@@ -222,14 +225,14 @@ private:
         cam->footer(footer);
         cam->require_subcommand(1);
         auto* import = AddAsking(*cam, "import", "Pin the certificate that a server must present",
-                                 arguments, [&](Output& output) {
+                                 arguments, [&](Console& console) {
                                      return RunCAMImport(arguments.server, arguments.file,
-                                                         arguments.limit, output);
+                                                         arguments.limit, console);
                                  });
-        auto* domain = AddAsking(*cam, "domain", "Tell which domain a server serves", arguments,
-                                 [&](Output& output) {
-                                     return RunCAMDomain(arguments.server, arguments.limit, output);
-                                 });
+        auto* domain = AddAsking(
+            *cam, "domain", "Tell which domain a server serves", arguments, [&](Console& console) {
+                return RunCAMDomain(arguments.server, arguments.limit, console);
+            });
         for (auto* command : {import, domain}) {
             command->add_option("server", arguments.server, "The server's IPv4 address")
                 ->required()
@@ -239,7 +242,7 @@ private:
             ->required()
             ->type_name("FILE");
         Add(*cam, "list", "List the pinned certificates by their thumbprints", arguments,
-            [](Output& output) { return RunCAMList(output); });
+            [](Console& console) { return RunCAMList(console); });
     }
 
     /// Passwords are read and never given: arguments and environments are open to others.
@@ -283,7 +286,7 @@ private:
     }
 
     CLI::App* Add(CLI::App& parent, char const* name, char const* description, Arguments& arguments,
-                  std::function<ExitCode(Output&)> run) {
+                  std::function<ExitCode(Console&)> run) {
         auto* command = parent.add_subcommand(name, description);
         command->footer(footer);
         command->set_version_flag("--version", "tslauthctl " TSLAUTH_VERSION);
@@ -298,13 +301,13 @@ private:
     }
 
     CLI::App* Add(char const* name, char const* description, Arguments& arguments,
-                  std::function<ExitCode(Output&)> run) {
+                  std::function<ExitCode(Console&)> run) {
         return Add(_app, name, description, arguments, std::move(run));
     }
 
     /// A command that has the provider or a server to wait for.
     CLI::App* AddAsking(CLI::App& parent, char const* name, char const* description,
-                        Arguments& arguments, std::function<ExitCode(Output&)> run) {
+                        Arguments& arguments, std::function<ExitCode(Console&)> run) {
         auto* command = Add(parent, name, description, arguments, std::move(run));
         command
             ->add_option(Limit::Name, arguments.limit.seconds,
@@ -315,7 +318,7 @@ private:
     }
 
     CLI::App _app;
-    std::function<ExitCode(Output&)> _run;
+    std::function<ExitCode(Console&)> _run;
 };
 
 /// Also where the arguments cannot be parsed.
@@ -334,31 +337,31 @@ int Run(int argc, char** argv) {
     int exitCode = 0;
     std::string error;
     auto const run = parser.Parse(argc, argv, exitCode, error);
-    Output output(arguments.json || AsksForJson(argc, argv), arguments.colour);
+    Console console(arguments.json || AsksForJson(argc, argv), arguments.colour);
     auto const command = parser.Command();
-    output.Document()["command"] = nullptr;
+    console.Document()["command"] = nullptr;
     if (!command.empty()) {
-        output.Document()["command"] = command;
+        console.Document()["command"] = command;
     }
-    output.Document()["error"] = nullptr;
+    console.Document()["error"] = nullptr;
     if (!run) {
         if (exitCode == 0) {
             return 0;
         }
-        output.Error(Failure(ExitCode::usage, error));
-        return output.Finish(static_cast<ExitCode>(exitCode));
+        console.Error(Failure(ExitCode::usage, error));
+        return console.Finish(static_cast<ExitCode>(exitCode));
     }
     try {
-        return output.Finish(run(output));
+        return console.Finish(run(console));
     } catch (Failure const& e) {
-        output.Error(e);
-        return output.Finish(e.Code());
+        console.Error(e);
+        return console.Finish(e.Code());
     } catch (std::bad_alloc const& e) {
-        output.Error(Failure(ExitCode::failure, e.what()));
-        return output.Finish(ExitCode::failure);
+        console.Error(Failure(ExitCode::failure, e.what()));
+        return console.Finish(ExitCode::failure);
     } catch (std::exception const& e) {
-        output.Error(Refused(e));
-        return output.Finish(ExitCode::refused);
+        console.Error(Refused(e));
+        return console.Finish(ExitCode::refused);
     }
 }
 

@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "analysis/Directory.h"
+
+#include "analysis/Failures.h"
+#include "analysis/Host.h"
+
+#include <tslauth/Exceptions.h>
+
+namespace tessel::tslauthctl {
+
+using namespace authentication;
+
+std::shared_ptr<ActiveDirectoryStore> OpenStore(Limit limit) {
+    return Explaining(Account::none,
+                      [&] { return std::make_shared<ActiveDirectoryStore>(limit.seconds); });
+}
+
+std::shared_ptr<ActiveDirectoryProvider> OpenProvider(Limit limit) {
+    // The store first, for its exceptions.
+    (void)OpenStore(limit);
+    return Explaining(Account::none, [] {
+        return std::make_shared<ActiveDirectoryProvider>(ConfiguredProvider());
+    });
+}
+
+namespace {
+
+Domain ActiveDomain(Console& console, Limit limit) {
+    auto const provider = OpenProvider(limit);
+    return Explaining(Account::none, [&] {
+        return Ask(console, "the provider to name the host's domain", limit,
+                   [provider] { return provider->GetActiveDomain(); });
+    });
+}
+
+} // namespace
+
+std::string RequireDomain(Console& console, Limit limit) {
+    auto const domain = ActiveDomain(console, limit);
+    if (!domain.DNSName().empty()) {
+        return domain.DNSName();
+    }
+    if (!domain.NetBIOSName().empty()) {
+        return domain.NetBIOSName();
+    }
+    throw Failure(ExitCode::notJoined, "The host is not joined to a domain");
+}
+
+bool IsKnownToBeUnjoined(Console& console, Limit limit) {
+    try {
+        auto const domain = ActiveDomain(console, limit);
+        return domain.DNSName().empty() && domain.NetBIOSName().empty();
+    } catch (Failure const&) {
+        return false;
+    }
+}
+
+} // namespace tessel::tslauthctl

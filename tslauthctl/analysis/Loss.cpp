@@ -1,0 +1,309 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "analysis/Loss.h"
+
+#include "terminal/Text.h"
+
+#include <tslauth/systemconfiguration/PAMEntry.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <cxxabi.h>
+#include <memory>
+#include <set>
+#include <sstream>
+#include <typeinfo>
+
+namespace tessel::tslauthctl {
+
+namespace {
+
+using authentication::ProviderModules::EditedNSSConfiguration;
+using authentication::ProviderModules::EditedPAMPolicy;
+
+/// One service or entry: what it says, and what it is known by when it says something else.
+struct Item {
+    std::string text;
+    std::string key;
+};
+
+using Items = std::vector<Item>;
+
+/// Those of `left` that are not in `right`, each as often as it is missing there.
+Items Missing(Items const& left, Items const& right) {
+    std::multiset<std::string> there;
+    for (auto const& item : right) {
+        there.insert(item.text);
+    }
+    Items missing;
+    for (auto const& item : left) {
+        if (auto const found = there.find(item.text); found != there.end()) {
+            there.erase(found);
+        } else {
+            missing.push_back(item);
+        }
+    }
+    return missing;
+}
+
+bool SameTexts(Items const& left, Items const& right) {
+    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
+                      [](Item const& a, Item const& b) { return a.text == b.text; });
+}
+
+/// @param where the database or facility
+/// @param kind "service" or "entry"
+void Compare(std::string const& where, std::string const& kind, std::string const& kinds,
+             Items const& before, Items const& after, std::vector<std::string>& losses) {
+    if (SameTexts(before, after)) {
+        return;
+    }
+    std::string const subject = where + ": " + kind + " '";
+    auto added = Missing(after, before);
+    auto const lost = Missing(before, after);
+    for (auto const& item : lost) {
+        auto const altered = std::find_if(added.begin(), added.end(),
+                                          [&](Item const& other) { return other.key == item.key; });
+        std::string loss = subject;
+        loss += item.text;
+        if (altered != added.end()) {
+            loss += "' would become '";
+            loss += altered->text;
+            loss += "'";
+            added.erase(altered);
+        } else {
+            loss += "' would be lost";
+        }
+        losses.push_back(std::move(loss));
+    }
+    for (auto const& item : added) {
+        std::string addition = subject;
+        addition += item.text;
+        addition += "' would be added";
+        losses.push_back(std::move(addition));
+    }
+    if (lost.empty() && added.empty()) {
+        losses.push_back(where + ": the order of the " + kinds + " would change");
+    }
+}
+
+/// Takes `inserted` out of `services` where it stands first from `place` on.
+bool Without(NSSServices const& services, NSSServices const& inserted, std::size_t place,
+             NSSServices& rest) {
+    if (inserted.size() + place > services.size() ||
+        !std::equal(inserted.begin(), inserted.end(),
+                    services.begin() + static_cast<std::ptrdiff_t>(place))) {
+        return false;
+    }
+    rest = services;
+    auto const start = rest.begin() + static_cast<std::ptrdiff_t>(place);
+    rest.erase(start, start + static_cast<std::ptrdiff_t>(inserted.size()));
+    return true;
+}
+
+Items ItemsOf(NSSServices const& services) {
+    Items items;
+    for (auto const& service : services) {
+        items.push_back({NSSText(service), service.name});
+    }
+    return items;
+}
+
+void CompareServices(std::string const& database, NSSServices const& before,
+                     NSSServices const& after, bool byDefault, std::vector<std::string>& losses) {
+    if (SameEffect(before, after)) {
+        return;
+    }
+    if (byDefault) {
+        auto const missing = Missing(ItemsOf(before), ItemsOf(after));
+        if (!missing.empty()) {
+            losses.push_back(database + ": the default '" + NSSText(before) +
+                             "', which holds without a line, would be lost");
+            return;
+        }
+    }
+    Compare(database, "service", "services", ItemsOf(before), ItemsOf(after), losses);
+}
+
+/// The text of an entry without its facility, for people.
+std::string EntryText(PAMLine const& line) {
+    auto plain = line;
+    plain.facility.clear();
+    plain.silent = false;
+    auto text = PAMText(plain);
+    std::replace(text.begin(), text.end(), '\t', ' ');
+    text.erase(0, text.find_first_not_of(' '));
+    return line.known ? text : line.facility + " " + text;
+}
+
+Items ItemsOf(std::vector<PAMLine> const& stack) {
+    Items items;
+    for (auto const& line : stack) {
+        items.push_back({EntryText(line), line.module});
+    }
+    return items;
+}
+
+/// Where `longer` has one line more than `shorter`, and that line is `entry`.
+std::optional<std::size_t> PlaceOf(PAMLine const& entry, std::vector<PAMLine> const& shorter,
+                                   std::vector<PAMLine> const& longer) {
+    if (longer.size() != shorter.size() + 1) {
+        return std::nullopt;
+    }
+    auto const differ = std::mismatch(shorter.begin(), shorter.end(), longer.begin());
+    if (!(*differ.second == entry) ||
+        !std::equal(differ.first, shorter.end(), differ.second + 1, longer.end())) {
+        return std::nullopt;
+    }
+    return static_cast<std::size_t>(differ.second - longer.begin());
+}
+
+/// Whether a jump of the stack without the entry at `place` and the same jump of the stack with it
+/// go on at the same module. Going on at the entry itself is as good: that module comes next.
+bool LandsTheSame(PAMJump const& without, PAMJump const& with, std::size_t place) {
+    if (!without.to || !with.to) {
+        auto const from = std::min(without.from, with.from);
+        return !without.to && !with.to && place <= from;
+    }
+    auto const to = *with.to > place ? *with.to - 1 : *with.to;
+    return to == *without.to && (*with.to == place ? 0 : with.within) == without.within;
+}
+
+void CompareJumps(std::string const& facility, std::vector<PAMLine> const& shorter,
+                  std::vector<PAMLine> const& longer, std::size_t place,
+                  PAMPolicyReader const& reader, std::vector<std::string>& losses) {
+    auto const without = PAMJumps(shorter, reader);
+    auto const with = PAMJumps(longer, reader);
+    for (std::size_t i = 0; i < without.size() && i < with.size(); ++i) {
+        if (!LandsTheSame(without[i], with[i], place)) {
+            losses.push_back(facility + ": the jump '" + without[i].criterion + "' of '" +
+                             EntryText(shorter[without[i].from]) + "' would land elsewhere");
+        }
+    }
+}
+
+} // namespace
+
+NSSServices Meaning(SystemConfiguration::NSSService const& service) {
+    std::ostringstream text;
+    text << "passwd: " << service;
+    auto line = ReadNSSLine(text.str());
+    return line ? std::move(line->services) : NSSServices();
+}
+
+PAMLine Meaning(SystemConfiguration::PAMEntry const& entry, std::string const& facility) {
+    std::ostringstream text;
+    text << facility << '\t' << entry << '\n';
+    auto meaning = ReadPAMMeaning(text.str());
+    return meaning.lines.empty() ? PAMLine() : std::move(meaning.lines.front());
+}
+
+std::vector<std::string> NSSLosses(std::string_view before, std::string_view after, Edit edit,
+                                   SystemConfiguration::NSSService const& service) {
+    auto const old = ReadNSSMeaning(before);
+    auto const made = ReadNSSMeaning(after);
+    auto const inserted = Meaning(service);
+    std::set<std::string> databases;
+    for (auto const* meaning : {&old, &made}) {
+        for (auto const& entry : meaning->databases) {
+            databases.insert(entry.first);
+        }
+    }
+    std::vector<std::string> losses;
+    for (auto const& database : databases) {
+        auto const known = EffectiveNSSServices(old, database);
+        auto was = known.value_or(NSSServices());
+        auto is = EffectiveNSSServices(made, database).value_or(NSSServices());
+        if (database == "passwd" || database == "group" || database == "shadow") {
+            NSSServices rest;
+            if (edit == Edit::insert) {
+                // Equal services are not inserted again: then nothing is set aside.
+                if (!SameEffect(was, is) && Without(is, inserted, 0, rest)) {
+                    is = rest;
+                }
+            } else {
+                for (std::size_t place = 0; place < was.size(); ++place) {
+                    if (Without(was, inserted, place, rest)) {
+                        was = rest;
+                        break;
+                    }
+                }
+            }
+        }
+        bool const byDefault = old.databases.count(database) == 0;
+        if (byDefault && !known && is.empty()) {
+            continue;
+        }
+        CompareServices(database, was, is, byDefault, losses);
+    }
+    return losses;
+}
+
+std::vector<std::string> PAMLosses(std::string_view before, std::string_view after, Edit edit,
+                                   SystemConfiguration::PAMEntry const& entry,
+                                   PAMPolicyReader const& reader) {
+    auto const old = ReadPAMMeaning(before);
+    auto const made = ReadPAMMeaning(after);
+    std::vector<std::string> losses;
+    for (auto const* facility : PAMFacilities) {
+        auto const was = PAMStackOf(old, facility);
+        auto const is = PAMStackOf(made, facility);
+        if (was == is) {
+            continue;
+        }
+        auto const& shorter = edit == Edit::insert ? was : is;
+        auto const& longer = edit == Edit::insert ? is : was;
+        auto const inserted = Meaning(entry, facility);
+        if (auto const place = PlaceOf(inserted, shorter, longer)) {
+            CompareJumps(facility, shorter, longer, *place, reader, losses);
+            if (edit == Edit::insert && !RunsAnything(was, reader)) {
+                losses.push_back(std::string(facility) +
+                                 ": the policy 'other', which decides where there is no entry, "
+                                 "would no longer");
+            }
+            continue;
+        }
+        auto oldItems = ItemsOf(was);
+        auto newItems = ItemsOf(is);
+        auto& more = edit == Edit::insert ? newItems : oldItems;
+        auto const& less = edit == Edit::insert ? oldItems : newItems;
+        auto const text = EntryText(inserted);
+        auto const extra = Missing(more, less);
+        if (std::any_of(extra.begin(), extra.end(),
+                        [&](Item const& item) { return item.text == text; })) {
+            more.erase(std::find_if(more.begin(), more.end(),
+                                    [&](Item const& item) { return item.text == text; }));
+        }
+        Compare(facility, "entry", "entries", oldItems, newItems, losses);
+    }
+    return losses;
+}
+
+std::vector<std::string> NSSLossesOnReturn(std::string_view text,
+                                           SystemConfiguration::NSSService const& service) {
+    try {
+        return NSSLosses(text, EditedNSSConfiguration(text, Edit::remove, service), Edit::remove,
+                         service);
+    } catch (std::exception const& e) {
+        return {"the library would no longer read the file: " + std::string(e.what())};
+    }
+}
+
+std::vector<std::string> PAMLossesOnReturn(std::string_view text,
+                                           SystemConfiguration::PAMEntry const& entry,
+                                           PAMPolicyReader const& reader) {
+    try {
+        return PAMLosses(text, EditedPAMPolicy(text, Edit::remove, entry), Edit::remove, entry,
+                         reader);
+    } catch (std::exception const& e) {
+        return {"the library would no longer read the file: " + std::string(e.what())};
+    }
+}
+
+std::string ClassName(std::exception const& exception) {
+    int status = 0;
+    std::unique_ptr<char, decltype(&std::free)> const name(
+        abi::__cxa_demangle(typeid(exception).name(), nullptr, nullptr, &status), &std::free);
+    return status == 0 ? name.get() : typeid(exception).name();
+}
+
+} // namespace tessel::tslauthctl

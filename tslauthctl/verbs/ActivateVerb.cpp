@@ -1,0 +1,120 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "analysis/Host.h"
+#include "analysis/Plan.h"
+#include "terminal/Text.h"
+#include "verbs/ControlLock.h"
+#include "verbs/Verbs.h"
+
+#include <tslauth/AuthenticationStore.h>
+#include <tslauth/Exceptions.h>
+
+#include <SystemFile.h>
+
+namespace tessel::tslauthctl {
+
+namespace {
+
+/// The files that are no longer what they were when the plan was made.
+std::vector<std::string> ChangedFiles(Plan const& plan) {
+    std::vector<std::string> changed;
+    for (auto const& file : plan.files) {
+        try {
+            if (authentication::ReadFile(file.path) != file.before) {
+                changed.push_back(file.path);
+            }
+        } catch (authentication::IOError const&) {
+            changed.push_back(file.path);
+        }
+    }
+    return changed;
+}
+
+void MakeActive(std::string const& store) {
+    auto const instance = Stores().CreateInstance(store);
+    if (!instance.get()) {
+        throw Failure(ExitCode::usage, "Unknown store '" + store + "'");
+    }
+    instance->MakeActive();
+}
+
+} // namespace
+
+ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console) {
+    RequireStore(store);
+    RequireRoot("activate");
+    ControlLock const lock(console);
+    auto const plan = MakePlan(store);
+    auto& document = console.Document();
+    document["changed"] = nlohmann::json::array();
+    document["store"] = store;
+    document["recorded"] = nullptr;
+    if (!plan.recorded.empty() || !plan.refusal) {
+        document["recorded"] = plan.recorded;
+    }
+    document["losses"] = nlohmann::json::array();
+    for (auto const& file : plan.files) {
+        for (auto const& loss : file.losses) {
+            document["losses"].push_back({{"path", file.path}, {"loss", loss}});
+        }
+    }
+    // Where the library would record "None" and then fail, its entries would stay for good: it does
+    // nothing the next time. So that is a loss to be accepted; an unknown store has left nothing
+    // that could be taken out, and there is no other way away from it.
+    bool const leavesEntries =
+        store == NoStore && plan.refusal && !plan.refusedAfterwards && !plan.files.empty();
+    if (plan.refusal && !plan.refusedAfterwards && !(leavesEntries && acceptLoss)) {
+        console.Error(
+            Failure(ExitCode::refused, plan.refusal->message, plan.refusal->exceptionClass));
+        console.ErrorDetail("nothing was changed");
+        if (leavesEntries) {
+            console.ErrorDetail("with --accept-loss 'None' is recorded all the same, and the "
+                                "provider's entries stay in the files");
+        }
+        AddPrepareHint(*plan.refusal, console);
+        return ExitCode::refused;
+    }
+    if (plan.Loses() && !acceptLoss) {
+        console.Error(
+            Failure(ExitCode::loss,
+                    "Activating '" + store + "' would lose what follows; nothing was changed"));
+        for (auto const& file : plan.files) {
+            for (auto const& loss : file.losses) {
+                console.ErrorDetail(file.path + ": " + loss);
+            }
+        }
+        console.ErrorDetail("see 'tslauthctl prepare', or give --accept-loss");
+        return ExitCode::loss;
+    }
+    try {
+        MakeActive(store);
+    } catch (std::exception const& e) {
+        console.Error(Refused(e));
+        auto const changed = ChangedFiles(plan);
+        document["changed"] = changed;
+        for (auto const& path : changed) {
+            console.ErrorDetail("changed before that: " + path);
+        }
+        if (changed.empty()) {
+            console.ErrorDetail("nothing was changed");
+        }
+        return ExitCode::refused;
+    }
+    auto const changed = ChangedFiles(plan);
+    document["changed"] = changed;
+    for (auto const& path : changed) {
+        console.Line("changed " + path);
+    }
+    for (auto const& file : plan.files) {
+        for (auto const& loss : file.losses) {
+            console.Warning(file.path + ": " + loss + ", as accepted");
+        }
+    }
+    console.Warnings(plan.warnings);
+    console.Line("'" + store + "' is active; " +
+                 (changed.empty() ? "nothing had to be changed"
+                                  : Counted(changed.size(), "file") + " changed") +
+                 ".");
+    return ExitCode::done;
+}
+
+} // namespace tessel::tslauthctl

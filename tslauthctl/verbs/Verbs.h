@@ -1,0 +1,66 @@
+// SPDX-License-Identifier: Apache-2.0
+#ifndef TSLAUTHCTL_VERBS_H
+#define TSLAUTHCTL_VERBS_H
+
+#include "terminal/Await.h"
+#include "terminal/Console.h"
+#include "terminal/Password.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+/// One function a command, each in the file of its name or in that of its kind. They report through
+/// `console`, say how the process ends, and throw `Failure` or the library's exceptions where they
+/// could not do their work.
+namespace tessel::tslauthctl {
+
+struct Plan;
+struct Refusal;
+
+ExitCode RunStores(Console& console);
+ExitCode RunStatus(Console& console);
+ExitCode RunPlan(std::string const& store, Console& console);
+ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console);
+ExitCode RunPrepare(bool write, bool acceptLoss, Console& console);
+
+/// In whose name a host is joined or parted.
+struct AccountArguments {
+    std::optional<std::string> user;
+    PasswordSource password;
+};
+
+struct JoinArguments {
+    /// "DOMAIN" or "DOMAIN/UNIT"; empty for a join through a CAM server.
+    std::string domain;
+    std::string server;
+    std::string unit;
+    AccountArguments account;
+    bool skipHostnameCheck = false;
+};
+
+ExitCode RunJoin(JoinArguments const& arguments, Limit limit, Console& console);
+ExitCode RunPart(AccountArguments const& arguments, Limit limit, Console& console);
+ExitCode RunInfo(Limit limit, Console& console);
+/// @param domain empty for the host's own
+ExitCode RunDC(std::string const& domain, Limit limit, Console& console);
+ExitCode RunPrincipal(std::string const& domain, Limit limit, Console& console);
+ExitCode RunCanonical(std::string const& name, Limit limit, Console& console);
+ExitCode RunPreferredDCs(Limit limit, Console& console);
+ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Limit limit,
+                            Console& console);
+ExitCode RunCAMImport(std::string const& server, std::string const& file, Limit limit,
+                      Console& console);
+ExitCode RunCAMList(Console& console);
+ExitCode RunCAMDomain(std::string const& server, Limit limit, Console& console);
+
+/// What `plan` shows of a plan, and `activate` before it refuses: JSON fields "store", "recorded",
+/// "files" and "refusal".
+void DescribePlan(Plan const& plan, Console& console);
+
+/// Below a refusal that comes from the reader of a system file.
+void AddPrepareHint(Refusal const& refusal, Console& console);
+
+} // namespace tessel::tslauthctl
+
+#endif
