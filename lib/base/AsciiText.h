@@ -80,10 +80,10 @@ inline std::string_view TakeLine(std::string_view& text) {
     return line;
 }
 
-/// Takes the first word off a text. Empty where there is none.
-inline std::string_view TakeWord(std::string_view& text) {
-    text.remove_prefix(std::min(text.find_first_not_of(WhiteSpace), text.size()));
-    auto const word = text.substr(0, text.find_first_of(WhiteSpace));
+/// Takes the first word off a text, with the `blanks` in front of it. Empty where there is none.
+inline std::string_view TakeWord(std::string_view& text, std::string_view blanks = WhiteSpace) {
+    text.remove_prefix(std::min(text.find_first_not_of(blanks), text.size()));
+    auto const word = text.substr(0, text.find_first_of(blanks));
     text.remove_prefix(word.size());
     return word;
 }

@@ -23,18 +23,36 @@ static_assert(sizeof(time_t) == 8, "compile with _TIME_BITS=64");
 
 namespace {
 
-constexpr char notRegular[] = "it is not a regular file";
-
-/// Room for the whole file, plus a byte, so that one call reads it and the next one meets its end.
-/// A special file has no size, and a large one is not trusted: a sparse file claims anything.
-std::size_t FirstGuess(int descriptor) {
+/// Reads to the end, or up to an error.
+/// @param size what the file says, if it says so. A special file has none, and a large one is not
+///     trusted: a sparse file claims anything.
+/// @return 0 or the number of the error
+int ReadUpToAnError(int descriptor, off_t size, std::string& text) {
     static constexpr off_t least = 4096;
     static constexpr off_t most = off_t{256} * 1024 * 1024;
-    struct stat status = {};
-    if (::fstat(descriptor, &status) != 0) {
-        return static_cast<std::size_t>(least);
+    // A byte more than the file has, so that one call reads it and the next one meets its end.
+    text.resize(static_cast<std::size_t>(std::clamp(size, off_t{0}, most - 1) + 1));
+    text.resize(std::max(text.size(), static_cast<std::size_t>(least)));
+    std::size_t length = 0;
+    int error = 0;
+    for (ssize_t count = 1; count != 0 && error == 0;) {
+        if (length == text.size()) {
+            text.resize(2 * length);
+        }
+        count = ::read(descriptor, &text[length], text.size() - length);
+        if (count > 0) {
+            length += static_cast<std::size_t>(count);
+        } else if (count < 0 && errno != EINTR) {
+            error = errno;
+        }
     }
-    return static_cast<std::size_t>(std::clamp(status.st_size + 1, least, most));
+    text.resize(length);
+    return error;
+}
+
+/// @return none where it cannot be opened; `errno` says why
+Descriptor OpenToRead(std::string const& path) {
+    return Descriptor(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
 }
 
 bool WriteAll(int descriptor, std::string_view text) {
@@ -62,41 +80,45 @@ bool GiveOwner(int descriptor, struct stat const& like) {
 } // namespace
 
 std::string ReadAll(int descriptor, std::string const& path) {
-    std::string text(FirstGuess(descriptor), '\0');
-    std::size_t length = 0;
-    for (;;) {
-        if (length == text.size()) {
-            text.resize(2 * length);
-        }
-        ssize_t const count = ::read(descriptor, &text[length], text.size() - length);
-        if (count > 0) {
-            length += static_cast<std::size_t>(count);
-        } else if (count == 0) {
-            text.resize(length);
-            return text;
-        } else if (errno != EINTR) {
-            throw FileError("read", path, errno);
-        }
+    std::string text;
+    if (int const error = ReadUpToAnError(descriptor, 0, text)) {
+        throw FileError("read", path, error);
+    }
+    return text;
+}
+
+ReadableFile::ReadableFile(std::string const& path) : _path(path), _file(OpenToRead(path)) {
+    if (!_file || ::fstat(_file.Get(), &_status) != 0) {
+        throw FileError("read", _path, errno);
     }
 }
 
+std::string ReadableFile::Text() const {
+    if (!IsRegular()) {
+        throw FileError("read", _path, NotRegular);
+    }
+    std::string text;
+    if (int const error = ReadUpToAnError(_file.Get(), _status.st_size, text)) {
+        throw FileError("read", _path, error);
+    }
+    return text;
+}
+
+std::string ReadableFile::TextUpToAnError() const {
+    std::string text;
+    (void)ReadUpToAnError(_file.Get(), _status.st_size, text); // what came before it is the answer
+    return text;
+}
+
 std::optional<std::string> ReadFile(std::string const& path) {
-    Descriptor const file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
-    if (!file) {
-        int const error = errno;
-        if (error == ENOENT || error == ENOTDIR) {
+    try {
+        return ReadableFile(path).Text();
+    } catch (FileError const& failure) {
+        if (failure.Error() == ENOENT || failure.Error() == ENOTDIR) {
             return std::nullopt;
         }
-        throw FileError("read", path, error);
+        throw;
     }
-    struct stat status = {};
-    if (::fstat(file.Get(), &status) != 0) {
-        throw FileError("read", path, errno);
-    }
-    if (!S_ISREG(status.st_mode)) {
-        throw FileError("read", path, notRegular);
-    }
-    return ReadAll(file.Get(), path);
 }
 
 std::string Destination(std::string const& path) {
@@ -174,7 +196,7 @@ void FileReplacement::Fill(std::string_view text, mode_t newMode) {
         throw FileError("replace", _path, errno);
     }
     if (_existed && !S_ISREG(like.st_mode)) {
-        throw FileError("replace", _path, notRegular);
+        throw FileError("replace", _path, NotRegular);
     }
     mode_t const mode = _existed ? like.st_mode & 07777 : newMode;
     // In this order: a change of the owner clears bits of the mode, and an access control list

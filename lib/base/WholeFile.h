@@ -6,15 +6,44 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <sys/stat.h>
 #include <sys/types.h>
 
 /// Files are read whole and replaced whole. Nothing here holds state, so that everything may be
 /// called from any thread; it blocks as long as the file system does.
 namespace tessel::base {
 
-/// The bytes of a regular file; nothing if there is none at `path`. Whatever else is there, a pipe
-/// that nobody writes to, say, is not waited for.
-/// @throws FileError
+/// A file, opened to be read whole. Whatever is at the path, a pipe that nobody writes to, say, is
+/// not waited for.
+class ReadableFile {
+public:
+    /// @throws FileError "Cannot read '" + path + "': " + the system's text
+    explicit ReadableFile(std::string const& path);
+
+    bool IsRegular() const noexcept {
+        return S_ISREG(_status.st_mode);
+    }
+    bool IsFolder() const noexcept {
+        return S_ISDIR(_status.st_mode);
+    }
+
+    /// The bytes of a regular file.
+    /// @throws FileError "Cannot read '" + path + "': " + the reason
+    std::string Text() const;
+
+    /// What could be read before the end or an error, as it is with an input stream.
+    std::string TextUpToAnError() const;
+
+private:
+    std::string _path;
+    Descriptor _file;
+    struct stat _status = {};
+};
+
+inline constexpr char NotRegular[] = "it is not a regular file";
+
+/// The bytes of a regular file; nothing if there is none at `path`.
+/// @throws FileError "Cannot read '" + path + "': " + the reason
 std::optional<std::string> ReadFile(std::string const& path);
 
 /// The bytes that an open descriptor still gives.
@@ -55,7 +84,8 @@ struct Replacing {
 /// process that is not root leaves the owner to the system.
 class FileReplacement {
 public:
-    /// @throws FileError "Cannot replace '" + path + "': " + the reason; nothing is left then
+    /// @throws FileError "Cannot replace '" + path + "': " + the reason, or as `Destination`; nothing
+    ///     is left then
     FileReplacement(std::string const& path, std::string_view text, Replacing how = {});
     FileReplacement(FileReplacement const&) = delete;
     FileReplacement& operator=(FileReplacement const&) = delete;

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/DnsConfigImpl.h>
 
+#include "Files.h"
 #include "Paths.h"
 #include "ResolvConfText.h"
-#include "WholeFile.h"
 
 #include <strandctl/HostCtlException.h>
 

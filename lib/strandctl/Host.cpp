@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/Host.h>
 
+#include "Files.h"
 #include "KeyValueText.h"
 #include "Paths.h"
-#include "WholeFile.h"
 
 #include <optional>
 #include <strandctl/HostCtlException.h>

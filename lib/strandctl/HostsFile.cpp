@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/HostsFile.h>
 
+#include "Files.h"
 #include "HostsText.h"
 #include "Paths.h"
-#include "WholeFile.h"
 
 namespace StrandCtl::Network {
 

@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "HostsText.h"
 
-#include "Lines.h"
-
 #include <algorithm>
 #include <arpa/inet.h>
 #include <array>
+#include <base/AsciiText.h>
 #include <cstddef>
 #include <netinet/in.h>
 #include <optional>
@@ -16,6 +15,8 @@ namespace StrandCtl {
 namespace {
 
 using HostCtl::Lib::HostCtlException;
+using tessel::base::AsciiText::TakeLine;
+using tessel::base::AsciiText::TakeWord;
 
 /// What separates words for the resolver. The carriage return of a CRLF line end is one of them.
 constexpr std::string_view blanks = " \t\r\v\f";

@@ -1,10 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Netlink.h"
 
-#include "WholeFile.h"
+#include "Files.h"
 
 #include <arpa/inet.h>
 #include <array>
+#include <base/Descriptor.h>
 #include <cerrno>
 #include <cstddef>
 #include <cstring>
@@ -12,29 +13,10 @@
 #include <string>
 #include <sys/socket.h>
 #include <sys/types.h>
-#include <unistd.h>
 
 namespace StrandCtl {
 
 namespace {
-
-class Socket {
-public:
-    Socket() : _number(::socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_ROUTE)) {}
-    Socket(Socket const&) = delete;
-    Socket& operator=(Socket const&) = delete;
-    ~Socket() {
-        if (_number >= 0) {
-            (void)::close(_number); // nothing is buffered in it that anybody needs
-        }
-    }
-    int Get() const {
-        return _number;
-    }
-
-private:
-    int _number;
-};
 
 /// A value of the kernel's structures at a place that may not be aligned for it; nothing if it does
 /// not fit.
@@ -89,8 +71,9 @@ std::optional<Body<Header>> ParseBody(nlmsghdr const& message, int wantedType) {
 /// One dump: asks for all objects of a kind and hands each message to `take`.
 /// @return 0, or an error number; EINTR if the kernel's answer was not of one moment
 template <typename Family, typename Take> int DumpOnce(std::uint16_t type, Take take) {
-    Socket const socket;
-    if (socket.Get() < 0) {
+    tessel::base::Descriptor const socket(
+        ::socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_ROUTE));
+    if (!socket) {
         return errno;
     }
     struct {

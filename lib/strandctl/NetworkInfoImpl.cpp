@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <strandctl/NetworkInfoImpl.h>
 
+#include "Files.h"
 #include "KeyValueText.h"
 #include "Netlink.h"
 #include "Paths.h"
-#include "WholeFile.h"
 
 #include <cerrno>
 #include <net/if.h>

@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "ResolvConfText.h"
 
-#include "Lines.h"
-
 #include <algorithm>
+#include <base/AsciiText.h>
 #include <cstddef>
 #include <resolv.h>
 #include <strandctl/HostCtlException.h>
@@ -14,6 +13,7 @@ namespace StrandCtl {
 namespace {
 
 using HostCtl::Lib::HostCtlException;
+using namespace tessel::base::AsciiText;
 
 /// What separates words for the resolver. A carriage return is none: it is part of the last name.
 constexpr std::string_view blanks = " \t";
@@ -24,18 +24,6 @@ constexpr std::size_t maximumCharacters = sizeof(__res_state::defdname) - 1;
 
 constexpr std::size_t maximumLabel = 63; // RFC 1035, 2.3.4, as for the whole name
 constexpr std::size_t maximumName = 253;
-
-char Lower(char character) {
-    return character >= 'A' && character <= 'Z' ? static_cast<char>(character - 'A' + 'a')
-                                                : character;
-}
-
-std::string Lower(std::string_view text) {
-    std::string lower(text);
-    std::transform(lower.begin(), lower.end(), lower.begin(),
-                   [](char character) { return Lower(character); });
-    return lower;
-}
 
 /// Two spellings of one domain give the same text.
 std::string Normal(std::string_view domain) {
@@ -58,10 +46,8 @@ bool IsDomainName(std::string_view name) {
             label = 0;
             continue;
         }
-        char const lower = Lower(character);
-        bool const allowed = (lower >= 'a' && lower <= 'z') ||
-                             (character >= '0' && character <= '9') || character == '-' ||
-                             character == '_';
+        bool const allowed =
+            IsLetter(character) || IsDigit(character) || character == '-' || character == '_';
         if (!allowed || ++label > maximumLabel) {
             return false;
         }
@@ -211,10 +197,6 @@ constexpr std::string_view ownersMarks[] = {"do not edit", "managed by", "genera
 constexpr std::string_view freeMark = "can be edited";
 constexpr std::string_view generalRemedy =
     "set the search domain in that program's own configuration";
-
-bool StartsWith(std::string_view text, std::string_view beginning) {
-    return text.substr(0, beginning.size()) == beginning;
-}
 
 } // namespace
 

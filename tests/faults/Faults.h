@@ -72,14 +72,21 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
 #ifdef __NR_open
         {__NR_open, "open"},
 #endif
-        {__NR_openat, "open"},         {__NR_read, "read"},      {__NR_write, "write"},
-        {__NR_writev, "write"},        {__NR_fsync, "fsync"},    {__NR_fdatasync, "fsync"},
+        {__NR_openat, "open"},
+        {__NR_read, "read"},
+        {__NR_write, "write"},
+        {__NR_writev, "write"},
+        {__NR_fsync, "fsync"},
+        {__NR_fdatasync, "fsync"},
         {__NR_ftruncate, "ftruncate"},
 #ifdef __NR_stat
-        {__NR_stat, "stat"},           {__NR_fstat, "stat"},
+        {__NR_stat, "stat"},
+        {__NR_fstat, "stat"},
 #endif
 #ifdef __NR_stat64
-        {__NR_stat64, "stat"},         {__NR_fstat64, "stat"},   {__NR_fstatat64, "stat"},
+        {__NR_stat64, "stat"},
+        {__NR_fstat64, "stat"},
+        {__NR_fstatat64, "stat"},
 #endif
 #ifdef __NR_newfstatat
         {__NR_newfstatat, "stat"},
@@ -88,7 +95,16 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
 #ifdef __NR_chmod
         {__NR_chmod, "chmod"},
 #endif
-        {__NR_fchmod, "chmod"},        {__NR_fchmodat, "chmod"},
+        {__NR_fchmod, "chmod"},
+        {__NR_fchmodat, "chmod"},
+        {__NR_fchown, "chown"},
+#ifdef __NR_fchown32
+        {__NR_fchown32, "chown"},
+#endif
+        {__NR_flistxattr, "listxattr"},
+        {__NR_fgetxattr, "getxattr"},
+        {__NR_fsetxattr, "setxattr"},
+        {__NR_fremovexattr, "removexattr"},
 #ifdef __NR_rename
         {__NR_rename, "rename"},
 #endif
@@ -99,7 +115,8 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
 #ifdef __NR_unlink
         {__NR_unlink, "unlink"},
 #endif
-        {__NR_unlinkat, "unlink"},     {__NR_close, "close"},
+        {__NR_unlinkat, "unlink"},
+        {__NR_close, "close"},
     };
     return calls;
 }

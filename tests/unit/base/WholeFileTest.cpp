@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "WholeFile.h"
+#include <base/WholeFile.h>
 
-#include "HostCtlFailure.h"
+#include "Attributes.h"
+#include "FileFailure.h"
 #include "TemporaryFolder.h"
 #include "Unprivileged.h"
 #include "faults/Faults.h"
@@ -9,12 +10,18 @@
 #include <cerrno>
 #include <filesystem>
 #include <gmock/gmock.h>
+#include <map>
+#include <stdexcept>
 #include <string>
 #include <sys/stat.h>
+#include <sys/types.h>
 #include <sys/wait.h>
+#include <sys/xattr.h>
+#include <tuple>
 #include <unistd.h>
+#include <vector>
 
-namespace StrandCtl {
+namespace tessel::base {
 namespace {
 
 using testing::ElementsAre;
@@ -72,14 +79,14 @@ TEST_F(WholeFileTest, AReaderOfTheOldFileKeepsReadingIt) {
 
 TEST_F(WholeFileTest, FilesOfOthersBesideTheTargetAreNotTouched) {
     SetContents(folder / "victim", "precious");
-    std::filesystem::create_symlink(folder / "victim", folder / "hosts.XXXXXX");
+    std::filesystem::create_symlink(folder / "victim", folder / ".tslauth-hosts.XXXXXX");
     std::filesystem::create_symlink(folder / "victim", folder / "hosts.tmp");
     std::filesystem::create_symlink(folder / "victim", folder / "hosts.new");
     SetContents(target, "old");
     ReplaceFile(target, "new");
     EXPECT_EQ("precious", Contents(folder / "victim"));
     EXPECT_THAT(folder.Names(),
-                ElementsAre("hosts", "hosts.XXXXXX", "hosts.new", "hosts.tmp", "victim"));
+                ElementsAre(".tslauth-hosts.XXXXXX", "hosts", "hosts.new", "hosts.tmp", "victim"));
 }
 
 TEST_F(WholeFileTest, ALinkStaysAndItsDestinationIsReplaced) {
@@ -135,8 +142,103 @@ TEST_F(WholeFileTest, WhatIsNoRegularFileIsAnError) {
     EXPECT_THAT(folder.Names(), ElementsAre("hosts"));
 }
 
+TEST_F(WholeFileTest, AnOpenedFileTellsItsKind) {
+    EXPECT_TRUE(ReadableFile(folder.Path()).IsFolder());
+    EXPECT_FALSE(ReadableFile(folder.Path()).IsRegular());
+    EXPECT_EQ("", ReadableFile(folder.Path()).TextUpToAnError());
+    SetContents(target, "a");
+    EXPECT_TRUE(ReadableFile(target).IsRegular());
+    EXPECT_FALSE(ReadableFile("/dev/null").IsRegular());
+    EXPECT_EQ("Cannot read '/dev/null': it is not a regular file",
+              FailureOf([] { ReadFile("/dev/null"); }));
+    EXPECT_EQ("Cannot read '" + (folder / "none") + "': No such file or directory",
+              FailureOf([&] { ReadableFile(folder / "none"); }));
+}
+
+TEST_F(WholeFileTest, EveryByteOfEveryLengthIsRead) {
+    std::string all;
+    for (int byte = 0; byte < 256; ++byte) {
+        all += static_cast<char>(byte);
+    }
+    for (std::size_t const size : {0U, 1U, 4095U, 4096U, 4097U, 8192U, 1000000U}) {
+        std::string text;
+        while (text.size() < size) {
+            text += all;
+        }
+        text.resize(size);
+        SetContents(target, text);
+        EXPECT_TRUE(ReadFile(target) == text) << size;
+    }
+}
+
+TEST_F(WholeFileTest, WhatHasNoSizeIsRead) {
+    EXPECT_THAT(*ReadFile("/proc/self/status"), testing::StartsWith("Name:"));
+    std::string const maps = *ReadFile("/proc/self/smaps");
+    EXPECT_GT(maps.size(), 8192U) << "no longer a test of a growing buffer";
+    EXPECT_EQ('\n', maps.back());
+    int ends[2];
+    ASSERT_EQ(0, ::pipe(ends));
+    Descriptor const reading(ends[0]);
+    ASSERT_EQ(5, ::write(ends[1], "piped", 5));
+    ASSERT_EQ(0, ::close(ends[1]));
+    EXPECT_EQ("piped", ReadAll(reading.Get(), "a pipe"));
+    EXPECT_EQ("Cannot read 'nothing': Bad file descriptor",
+              FailureOf([] { ReadAll(-1, "nothing"); }));
+}
+
+TEST_F(WholeFileTest, ALinkCanBeReplacedByAFile) {
+    SetContents(folder / "real", "old");
+    std::filesystem::create_symlink("real", target);
+    ReplaceFile(target, "new", {Links::Replace, 0600});
+    EXPECT_FALSE(std::filesystem::is_symlink(target));
+    EXPECT_EQ("new", Contents(target));
+    EXPECT_EQ(0600U, ModeOf(target));
+    EXPECT_EQ("old", Contents(folder / "real"));
+}
+
+TEST_F(WholeFileTest, ANewFileHasTheModeThatIsAskedFor) {
+    ReplaceFile(target, "new", {Links::Follow, 0640});
+    EXPECT_EQ(0640U, ModeOf(target));
+    ReplaceFile(target, "newer", {Links::Follow, 0600});
+    EXPECT_EQ(0640U, ModeOf(target)) << "it is new no more";
+}
+
+TEST_F(WholeFileTest, ANewFileHasNoListOfItsFolders) {
+    if (!attributes::Set(folder.Path(), attributes::DefaultList, attributes::ListFor(54321))) {
+        GTEST_SKIP() << "the temporary folder's file system has no access control lists";
+    }
+    SetContents(target, "old");
+    ASSERT_EQ(0, ::removexattr(target.c_str(), attributes::AccessList));
+    ReplaceFile(target, "new");
+    EXPECT_EQ(0U, attributes::Of(target).count(attributes::AccessList)) << "the old one had none";
+}
+
+TEST_F(WholeFileTest, ARelativePathMeansTheWorkingFolder) {
+    std::filesystem::path const before = std::filesystem::current_path();
+    std::filesystem::current_path(folder.Path());
+    ReplaceFile("relative", "a", {Links::Replace, 0644});
+    ReplaceFile("relative", "b");
+    std::filesystem::current_path(before);
+    EXPECT_EQ("b", Contents(folder / "relative"));
+    EXPECT_THAT(folder.Names(), ElementsAre("relative"));
+}
+
+TEST_F(WholeFileTest, NoDescriptorStaysOpen) {
+    auto const count = [] {
+        return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+    };
+    auto const before = count();
+    ReplaceFile(target, "a");
+    ReadFile(target);
+    FailureOf([&] { ReadFile(folder.Path()); });
+    FailureOf([&] { ReplaceFile(folder.Path(), "a"); });
+    EXPECT_EQ(before, count());
+}
+
 TEST_F(WholeFileTest, AMissingFileIsNothingAndAMissingFolderAnError) {
     EXPECT_EQ(std::nullopt, ReadFile(target));
+    SetContents(folder / "file", "");
+    EXPECT_EQ(std::nullopt, ReadFile(folder / "file/below"));
     EXPECT_EQ("Cannot replace '" + (folder / "none/hosts") + "': No such file or directory",
               FailureOf([&] { ReplaceFile(folder / "none/hosts", "new"); }));
 }
@@ -175,52 +277,72 @@ TEST_F(WholeFileTest, AFileThatMayNotBeReadIsAnError) {
     EXPECT_EQ(0, status);
 }
 
+/// The faults meet a target whose access control list has to be carried over, and a folder that
+/// gives one of its own to new files, where the file system knows such lists.
 class WholeFileFaultsTest : public WholeFileTest {
 protected:
     void SetUp() override {
         if (!faults::Available()) {
             GTEST_SKIP() << "this kernel does not let a process be watched";
         }
+        (void)attributes::Set(folder.Path(), attributes::DefaultList, attributes::ListFor(11111));
     }
-    void Prepare() const {
+    void Prepare() {
         for (std::string const& name : folder.Names()) {
             std::filesystem::remove(folder / name);
         }
         SetContents(target, "old");
+        (void)attributes::Set(target, attributes::AccessList, attributes::ListFor(22222));
         ASSERT_EQ(0, ::chmod(target.c_str(), 0640));
+        kept = Kept();
     }
+    /// What no replacement may change.
+    std::tuple<mode_t, uid_t, gid_t, std::map<std::string, std::string>> Kept() const {
+        struct stat status = {};
+        EXPECT_EQ(0, ::stat(target.c_str(), &status));
+        return {status.st_mode, status.st_uid, status.st_gid, attributes::Of(target)};
+    }
+
+    std::tuple<mode_t, uid_t, gid_t, std::map<std::string, std::string>> kept;
 };
 
 TEST_F(WholeFileFaultsTest, WhateverCallFailsTheTargetIsWholeAndTheCallerKnows) {
     int failures = 0;
     for (int const error : {ENOSPC, EIO, EDQUOT}) {
-        faults::Walk(
+        std::size_t const calls = faults::Walk(
             faults::FailsWith(error), [&] { Prepare(); }, [&] { ReplaceFile(target, "new"); },
             [&](std::size_t place, faults::Outcome const& outcome) {
                 SCOPED_TRACE(outcome.calls[place - 1] + " " + std::to_string(place));
                 EXPECT_TRUE(outcome.finished);
                 if (outcome.exception.empty()) {
                     EXPECT_EQ("new", Contents(target));
-                    EXPECT_EQ(0640U, ModeOf(target));
                 } else {
                     ++failures;
-                    EXPECT_EQ("HostCtl::Lib::HostCtlException", outcome.exception);
+                    EXPECT_EQ("tessel::base::FileError", outcome.exception);
                     EXPECT_THAT(outcome.message, testing::HasSubstr(target));
                     EXPECT_EQ("old", Contents(target));
                 }
+                EXPECT_EQ(kept, Kept());
                 EXPECT_THAT(folder.Names(), ElementsAre("hosts"));
             });
+        EXPECT_GE(calls, 12U);
     }
-    EXPECT_GE(failures, 3 * 5) << "creating, writing, its mode, syncing and moving must be noticed";
+    EXPECT_GE(failures, 3 * 8)
+        << "creating, opening, writing, owner, attributes, mode, syncing and "
+           "moving must be noticed";
 }
 
 TEST_F(WholeFileFaultsTest, KilledAnywhereTheTargetIsWhole) {
     faults::Walk(
         faults::Killed(), [&] { Prepare(); }, [&] { ReplaceFile(target, "new"); },
         [&](std::size_t place, faults::Outcome const& outcome) {
+            SCOPED_TRACE(outcome.calls[place - 1] + " " + std::to_string(place));
             EXPECT_FALSE(outcome.finished);
-            EXPECT_THAT(Contents(target), testing::AnyOf("old", "new")) << place;
-            EXPECT_EQ(0640U, ModeOf(target));
+            EXPECT_THAT(Contents(target), testing::AnyOf("old", "new"));
+            EXPECT_EQ(kept, Kept());
+            for (std::string const& name : folder.Names()) {
+                EXPECT_TRUE(name == "hosts" || name.rfind(TemporaryPrefix, 0) == 0) << name;
+            }
         });
 }
 
@@ -240,27 +362,56 @@ TEST_F(WholeFileFaultsTest, AnInterruptedCallIsMadeAgain) {
     }
 }
 
-TEST_F(WholeFileFaultsTest, TheTextIsSyncedBeforeItTakesTheTargetsPlace) {
+TEST_F(WholeFileFaultsTest, EverythingIsSyncedBeforeItTakesTheTargetsPlace) {
     Prepare();
     auto const outcome =
         faults::Run([&] { ReplaceFile(target, "new"); },
                     [](std::size_t, std::string const&) { return faults::Happens(); });
     std::vector<std::string> steps;
     for (std::string const& call : outcome.calls) {
-        if (call == "write" || call == "chmod" || call == "fsync" || call == "rename") {
+        if (call == "write" || call == "chown" || call == "chmod" || call == "fsync" ||
+            call == "rename") {
             steps.push_back(call);
         }
     }
-    EXPECT_THAT(steps, ElementsAre("write", "chmod", "fsync", "rename", "fsync"));
+    EXPECT_THAT(steps, ElementsAre("write", "chown", "chmod", "fsync", "rename", "fsync"));
 }
 
 TEST_F(WholeFileFaultsTest, AReadThatFailsInTheMiddleIsAnError) {
-    SetContents(target, std::string(100000, 'x'));
+    SetContents(target, "abc");
+    for (std::size_t const call : {1U, 2U}) {
+        auto const outcome = faults::RunWithFaultIn(
+            "read", faults::FailsWith(EIO), [&] { ReadFile(target); }, call, 1);
+        EXPECT_TRUE(outcome.injected);
+        EXPECT_EQ("Cannot read '" + target + "': Input/output error", outcome.message);
+    }
+}
+
+TEST_F(WholeFileFaultsTest, AReadErrorEndsTheTextWhereThatIsWanted) {
+    SetContents(target, "abc");
     auto const outcome = faults::RunWithFaultIn(
-        "read", faults::FailsWith(EIO), [&] { ReadFile(target); }, 3, 1);
+        "read", faults::FailsWith(EIO),
+        [&] { throw std::runtime_error(ReadableFile(target).TextUpToAnError()); }, 2, 1);
     EXPECT_TRUE(outcome.injected);
-    EXPECT_EQ("Cannot read '" + target + "': Input/output error", outcome.message);
+    EXPECT_EQ("abc", outcome.message);
+}
+
+TEST_F(WholeFileFaultsTest, ReadingMakesFiveCalls) {
+    SetContents(target, std::string(100000, 'a'));
+    auto const outcome = faults::RunWithFaultAt(0, faults::Killed(), [&] { ReadFile(target); });
+    EXPECT_THAT(outcome.calls, ElementsAre("open", "stat", "read", "read", "close"));
+}
+
+TEST_F(WholeFileFaultsTest, AReplacementThatIsGivenUpLeavesNothing) {
+    Prepare();
+    {
+        FileReplacement const replacement(target, "new");
+        EXPECT_TRUE(replacement.Existed());
+        EXPECT_EQ(2U, folder.Names().size());
+    }
+    EXPECT_EQ("old", Contents(target));
+    EXPECT_THAT(folder.Names(), ElementsAre("hosts"));
 }
 
 } // namespace
-} // namespace StrandCtl
+} // namespace tessel::base
