@@ -34,6 +34,9 @@ readonly login_packages=(
     diffutils
 )
 
+# What the tests need beyond those.
+readonly test_packages=(googletest python3-jsonschema patch binutils)
+
 missing_packages() {
     local -A installed=()
     local name
@@ -52,7 +55,8 @@ install_packages() {
     local -a missing apt
     mapfile -t missing < <(missing_packages "$@")
     ((${#missing[@]})) || return 0
-    apt=(env DEBIAN_FRONTEND=noninteractive apt-get -y -q -o Dpkg::Use-Pty=0)
+    apt=(env DEBIAN_FRONTEND=noninteractive apt-get -y -q -o Dpkg::Use-Pty=0
+        -o DPkg::Lock::Timeout=120)
     "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null ||
         { "${apt[@]}" update </dev/null &&
             "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null; }

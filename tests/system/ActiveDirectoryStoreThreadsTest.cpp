@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "GatedHost.h"
-#include "TimedWait.h"
 
 #include <tslauth/Exceptions.h>
 

@@ -1,6 +1,4 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "../TimedWait.h"
-
 #include <tslauth/Exceptions.h>
 #include <tslauth/RequestState.h>
 #include <tslauth/TslauthThreadUtil.h>

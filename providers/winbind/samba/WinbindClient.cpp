@@ -143,6 +143,9 @@ ActiveDirectoryClientErrorCode CodeOfWinbind(wbcErr error) {
     case WBC_ERR_UNKNOWN_FAILURE:
     case WBC_ERR_INVALID_SID:
     case WBC_ERR_NSS_ERROR:
+#if WBCLIENT_MINOR_VERSION >= 16
+    case WBC_ERR_NOT_MAPPED:
+#endif
         return TSLAUTH_PROVIDER_INTERNAL_ERROR;
     }
     return TSLAUTH_PROVIDER_INTERNAL_ERROR; // a number of a later libwbclient

@@ -436,7 +436,7 @@ class Log(Folder):
     def test_the_program_says_what_the_stdout_has_no_letters_for(self):
         with tempfile.TemporaryDirectory() as folder:
             run = [sys.executable, "-B", PROGRAM]
-            environment = {**os.environ, "PYTHONIOENCODING": "ascii", "PYTHONUTF8": "0"}
+            environment = {**os.environ, "LC_ALL": "C.UTF-8", "PYTHONIOENCODING": "ascii"}
             subprocess.run([*run, "issue-code", "--state", folder, "--host", "h", "--unit", "Büro"],
                            check=True, capture_output=True, env=environment)
             listed = subprocess.run([*run, "list-codes", "--state", folder], check=True, text=True,
