@@ -21,7 +21,7 @@ constexpr bool IsLetter(char c) {
 }
 
 constexpr bool IsControl(char c) {
-    return (c >= '\0' && c < ' ') || c == '\x7f';
+    return static_cast<unsigned char>(c) < ' ' || c == '\x7f'; // on some machines no char is below 0
 }
 
 constexpr char Lower(char c) {
