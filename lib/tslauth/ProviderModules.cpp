@@ -46,7 +46,7 @@ NSSService NSSServiceFor(std::string const& module, std::list<std::string> const
 
 void Apply(Edit edit, PAMEntry const& entry, PAMPolicy& policy) {
     std::string const access = std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule;
-    for (auto const facility : {PAMFacility::auth, PAMFacility::account}) {
+    for (auto const facility : EditedFacilities) {
         switch (edit) {
         case Edit::insert: {
             auto& stack = policy[facility];
@@ -67,7 +67,7 @@ void Apply(Edit edit, PAMEntry const& entry, PAMPolicy& policy) {
 }
 
 void Apply(Edit edit, NSSService const& service, NSSConfiguration& configuration) {
-    for (auto const database : {NSSDatabase::passwd, NSSDatabase::group, NSSDatabase::shadow}) {
+    for (auto const database : EditedDatabases) {
         switch (edit) {
         case Edit::insert: {
             auto& services = configuration[database];

@@ -15,6 +15,13 @@ namespace tessel::authentication::ProviderModules {
 /// `insert` puts the provider's modules into a file, `remove` takes them out again.
 enum class Edit { insert, remove };
 
+/// Where a provider's entry stands, and its service.
+inline constexpr SystemConfiguration::PAMFacility::Facility EditedFacilities[] = {
+    SystemConfiguration::PAMFacility::auth, SystemConfiguration::PAMFacility::account};
+inline constexpr SystemConfiguration::NSSDatabase::Database EditedDatabases[] = {
+    SystemConfiguration::NSSDatabase::passwd, SystemConfiguration::NSSDatabase::group,
+    SystemConfiguration::NSSDatabase::shadow};
+
 /// The entry for the PAM module of a provider: "sufficient", the module in the directory that the
 /// policy names, the parameters.
 SystemConfiguration::PAMEntry PAMEntryFor(std::string const& module,

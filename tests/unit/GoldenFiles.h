@@ -12,6 +12,7 @@
 #include <iterator>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 namespace SystemFileModels {
 
@@ -23,17 +24,23 @@ inline std::string Contents(std::filesystem::path const& path) {
     return {std::istreambuf_iterator<char>(in), {}};
 }
 
+/// The texts that there are golden files for.
+template <typename Kind> std::vector<std::filesystem::path> GoldenTexts() {
+    std::vector<std::filesystem::path> paths;
+    auto const folder = std::filesystem::path(TESTS_DATA_DIR) / Kind::folder;
+    for (auto const& file : std::filesystem::directory_iterator(folder)) {
+        if (file.path().extension() == ".in") {
+            paths.push_back(file.path());
+        }
+    }
+    return paths;
+}
+
 /// Each `NAME.in` below the model's folder must read and print as `NAME.out` says, or fail as
 /// `NAME.error` says. Both ways of reading, and both of printing.
 template <typename Kind> void ExpectGoldenFiles(std::size_t atLeast) {
-    auto const folder = std::filesystem::path(TESTS_DATA_DIR) / Kind::folder;
-    std::size_t cases = 0;
-    for (auto const& file : std::filesystem::directory_iterator(folder)) {
-        auto path = file.path();
-        if (path.extension() != ".in") {
-            continue;
-        }
-        ++cases;
+    auto const texts = GoldenTexts<Kind>();
+    for (auto path : texts) {
         SCOPED_TRACE(path.filename());
         auto const text = Contents(path);
         bool const fails = std::filesystem::exists(path.replace_extension(".error"));
@@ -45,7 +52,7 @@ template <typename Kind> void ExpectGoldenFiles(std::size_t atLeast) {
         EXPECT_EQ(NormalisedThroughStreams<Kind>(text), expected);
         EXPECT_EQ(FromText<Kind>(text), FromStream<Kind>(text));
     }
-    EXPECT_GE(cases, atLeast);
+    EXPECT_GE(texts.size(), atLeast);
 }
 
 } // namespace SystemFileModels

@@ -132,6 +132,8 @@ std::string NSSText(NSSServices const& services) {
 }
 
 std::optional<NSSLine> ReadNSSLine(std::string_view line) {
+    auto const* const start = line.data();
+    auto const position = [&] { return static_cast<std::size_t>(line.data() - start); };
     line = line.substr(0, line.find('\n'));
     line = line.substr(0, line.find('\0'));
     SkipSpace(line);
@@ -156,6 +158,7 @@ std::optional<NSSLine> ReadNSSLine(std::string_view line) {
     }
     while (true) {
         SkipSpace(line);
+        auto const begin = position();
         auto const name = TakeUntil(line, "[");
         if (name.empty()) {
             result.unreadRest = !line.empty();
@@ -163,6 +166,8 @@ std::optional<NSSLine> ReadNSSLine(std::string_view line) {
         }
         NSSServiceMeaning service;
         service.name = name;
+        service.begin = begin;
+        service.end = position();
         SkipSpace(line);
         if (!line.empty() && line.front() == '[') {
             auto const bracket = line;
@@ -170,10 +175,12 @@ std::optional<NSSLine> ReadNSSLine(std::string_view line) {
             if (!TakeCriteria(line, service.actions)) {
                 service.name += " ";
                 service.name += bracket;
+                service.end = bracket.size() + static_cast<std::size_t>(bracket.data() - start);
                 result.faulty = true;
                 result.services.push_back(std::move(service));
                 return result;
             }
+            service.end = position();
         }
         result.services.push_back(std::move(service));
     }

@@ -30,7 +30,11 @@ inline constexpr NSSActions DefaultNSSActions = {NSSAction::leave, NSSAction::pr
 struct NSSServiceMeaning {
     std::string name;
     NSSActions actions = DefaultNSSActions;
+    /// Where it stands in its line, its bracket included.
+    std::size_t begin = 0;
+    std::size_t end = 0;
 
+    /// Without regard to the place.
     bool operator==(NSSServiceMeaning const& other) const {
         return name == other.name && actions == other.actions;
     }

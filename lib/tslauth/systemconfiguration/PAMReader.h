@@ -10,6 +10,7 @@
 #include <list>
 #include <string>
 #include <string_view>
+#include <utility>
 
 /// The one reader of PAM lines, for a stream and for a text in memory alike.
 namespace SystemConfiguration {
@@ -44,31 +45,49 @@ inline void ReadParameters(std::string_view line, std::list<std::string>& parame
     }
 }
 
+/// Moves to the next line that holds an entry: past blank lines and comments.
+/// @return whether there is one
+template <typename Input> bool MoveToEntry(Input& in) {
+    while (in.Good()) {
+        in.SkipSpace();
+        if (!in.Sees('#')) {
+            return !in.AtEnd();
+        }
+        in.SkipLine();
+    }
+    return false;
+}
+
+/// One entry as it stands in a policy. The words live as long as those of the input.
+struct PAMEntryLine {
+    PAMFacility::Facility facility{};
+    PAMControl control;
+    std::string_view module;
+    std::string_view parameters;
+};
+
+/// Reads the entry that `MoveToEntry` has found, up to its line feed.
+template <typename Input> PAMEntryLine ReadEntryLine(Input& in) {
+    PAMEntryLine line;
+    line.facility = Words::ValueOf<PAMFacility>(in.Word());
+    ReadControl(in, line.control);
+    line.module = in.Word();
+    line.parameters = in.Line();
+    return line;
+}
+
 /// Reads a whole policy and appends to its stacks.
 template <typename Input> void ReadLines(Input& in, PAMPolicy& policy) {
     // A stack is made when its first line has been understood, and looked up once.
     PAMStack* stacks[PAMFacility::session + 1] = {};
-    while (in.Good()) {
-        in.SkipSpace();
-        if (in.Sees('#')) {
-            in.SkipLine();
-            continue;
-        }
-        if (in.AtEnd()) {
-            break;
-        }
-        auto const facility = Words::ValueOf<PAMFacility>(in.Word());
-        PAMControl control;
-        ReadControl(in, control);
-        std::string_view const module = in.Word();
-        std::string_view const line = in.Line();
-
-        PAMStack*& stack = stacks[facility];
+    while (MoveToEntry(in)) {
+        auto line = ReadEntryLine(in);
+        PAMStack*& stack = stacks[line.facility];
         if (stack == nullptr) {
-            stack = &policy[facility];
+            stack = &policy[line.facility];
         }
-        stack->emplace_back(std::move(control), module.data(), module.size());
-        ReadParameters(line, stack->back().parameters());
+        stack->emplace_back(std::move(line.control), line.module.data(), line.module.size());
+        ReadParameters(line.parameters, stack->back().parameters());
     }
 }
 
