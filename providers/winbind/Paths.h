@@ -38,6 +38,11 @@ inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";
 inline constexpr char TemporaryPrefix[] = ".tslauth-";
 inline constexpr char OriginalSuffix[] = ".original";
 
+/// Tells the PAM module whether the domain lets a user log in; installed beside the provider.
+inline constexpr char AccountProgram[] = "/usr/libexec/tslauth/winbind-account";
+/// Samba's PAM module, in the folder of the provider's own.
+inline constexpr char SambaPAMModule[] = "pam_winbind.so";
+
 inline constexpr char SystemdRunning[] = "/run/systemd/system";
 
 } // namespace tessel::winbind::Paths

@@ -119,10 +119,10 @@ static int GetDomainTrustRelationshipEntry(char const* domain) {
 
 ActiveDirectoryClientMetadataRecord const ActiveDirectoryClientMetadata = {
     TSLAUTH_PROVIDER_API_VERSION,
-    "pam_winbind.so",
+    "pam_tslauth_winbind.so",
     // README.md says why each of them.
     "try_first_pass",
-    "winbind",
+    "tslauth_winbind",
     nullptr,
 };
 

@@ -258,4 +258,27 @@ std::string WinbindClient::GetUserName(std::string const& domain, std::string co
                });
 }
 
+WinbindClient::Account WinbindClient::GetAccount(std::string const& name) const {
+    return Ask("the account of '" + name + "'", _deadline, [name](Connection const& winbindd) {
+        passwd* foundEntry = nullptr;
+        wbcErr const error = wbcCtxGetpwnam(winbindd.Context(), name.c_str(), &foundEntry);
+        if (error == WBC_ERR_DOMAIN_NOT_FOUND || error == WBC_ERR_UNKNOWN_USER) {
+            throw winbindd.Failed(TSLAUTH_PROVIDER_NO_SUCH_USER, "there is none");
+        }
+        winbindd.Check(error);
+        Owned<passwd> const entry(foundEntry);
+        wbcDomainSid sid = {};
+        winbindd.Check(wbcCtxUidToSid(winbindd.Context(), entry->pw_uid, &sid));
+        char* foundDomain = nullptr;
+        char* foundName = nullptr;
+        wbcSidType type = WBC_SID_NAME_USE_NONE;
+        winbindd.Check(wbcCtxLookupSid(winbindd.Context(), &sid, &foundDomain, &foundName, &type));
+        Owned<char> const domain(foundDomain);
+        Owned<char> const accountName(foundName);
+        char identifier[WBC_SID_STRING_BUFLEN] = {};
+        (void)wbcSidToStringBuf(&sid, identifier, sizeof identifier); // long enough for every one
+        return Account{identifier, TextOrEmpty(domain.get())};
+    });
+}
+
 } // namespace tessel::winbind

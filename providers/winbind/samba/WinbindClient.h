@@ -42,6 +42,11 @@ public:
         std::uint32_t trustType;      // WBC_DOMINFO_TRUSTTYPE_...
     };
 
+    struct Account {
+        std::string identifier; // S-1-5-21-...
+        std::string domain;     // the NetBIOS name of the domain that it is of
+    };
+
     explicit WinbindClient(BoundedCall::Clock::time_point deadline);
 
     /// Returns where winbindd runs and answers. Asks no controller.
@@ -67,6 +72,10 @@ public:
     /// The user `name` of `domain` as the name service of this host prints it.
     /// @throws Failure `TSLAUTH_PROVIDER_NO_SUCH_USER` also for what is no user
     std::string GetUserName(std::string const& domain, std::string const& name) const;
+
+    /// The user whom the name service of this host knows by `name`, in whatever form.
+    /// @throws Failure `TSLAUTH_PROVIDER_NO_SUCH_USER`
+    Account GetAccount(std::string const& name) const;
 
 private:
     BoundedCall::Clock::time_point _deadline;

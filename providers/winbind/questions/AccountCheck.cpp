@@ -1,0 +1,114 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "questions/AccountCheck.h"
+
+#include "Failure.h"
+#include "host/Membership.h"
+#include "host/SystemLog.h"
+#include "samba/WinbindClient.h"
+
+#include <cstdint>
+#include <cstdlib>
+#include <exception>
+#include <ratio>
+#include <vector>
+
+namespace tessel::winbind {
+
+namespace {
+
+constexpr char control[] = "userAccountControl";
+constexpr char computed[] = "msDS-User-Account-Control-Computed";
+constexpr char expiry[] = "accountExpires";
+
+/// Bits of both of the first two.
+constexpr std::uint32_t accountDisable = 0x2;
+constexpr std::uint32_t lockout = 0x10;
+
+/// What the directory counts time in, from 1601 on.
+typedef std::chrono::duration<std::int64_t, std::ratio<1, 10000000>> Ticks;
+constexpr Ticks from1601To1970 = std::chrono::seconds(11644473600);
+
+/// Both mean that the account never expires.
+bool IsNever(std::int64_t ticks) {
+    return ticks == 0 || ticks == INT64_MAX;
+}
+
+/// 0 where the directory says nothing.
+std::int64_t NumberIn(DirectoryEntry const& entry, char const* attribute) {
+    return std::strtoll(ValueIn(entry, attribute).c_str(), nullptr, 10);
+}
+
+bool HasBit(DirectoryEntry const& entry, char const* attribute, std::uint32_t bit) {
+    return (static_cast<std::uint32_t>(NumberIn(entry, attribute)) & bit) != 0;
+}
+
+/// A name that has its domain in it is nobody else's.
+bool NamesADomain(std::string const& user) {
+    return user.find_first_of("\\@") != std::string::npos;
+}
+
+AccountAnswer AskDirectory(WinbindClient const& client, SambaDomain const& own,
+                           WinbindClient::Account const& account,
+                           BoundedCall::Clock::time_point deadline) {
+    // winbindd prints the domain's name in capitals, whatever the join was told.
+    std::string const controller = account.domain == own.workgroup
+                                       ? std::string()
+                                       : client.FindDomainController(account.domain, "");
+    std::vector<DirectoryEntry> const entries =
+        SearchDirectory(controller, "(objectSid=" + account.identifier + ")",
+                        {control, computed, expiry}, deadline);
+    if (entries.size() != 1) {
+        throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER,
+                      "the directory has no account " + account.identifier);
+    }
+    return StateOfAccount(entries.front(), std::chrono::system_clock::now());
+}
+
+AccountAnswer Ask(std::string const& user, BoundedCall::Clock::time_point deadline) {
+    auto const membership = Membership::Read();
+    if (!membership) {
+        return AccountAnswer::NotOfTheDomain;
+    }
+    WinbindClient const client(deadline);
+    try {
+        return AskDirectory(client, membership->domain, client.GetAccount(user), deadline);
+    } catch (Failure const& failure) {
+        if (failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_USER && !NamesADomain(user)) {
+            return AccountAnswer::NotOfTheDomain;
+        }
+        throw;
+    }
+}
+
+} // namespace
+
+AccountAnswer StateOfAccount(DirectoryEntry const& entry,
+                             std::chrono::system_clock::time_point now) {
+    if (entry.count(control) == 0) {
+        return AccountAnswer::NoAnswer;
+    }
+    if (HasBit(entry, control, accountDisable)) {
+        return AccountAnswer::Disabled;
+    }
+    std::int64_t const end = NumberIn(entry, expiry);
+    Ticks const today = std::chrono::duration_cast<Ticks>(now.time_since_epoch()) + from1601To1970;
+    if (!IsNever(end) && Ticks(end) <= today) {
+        return AccountAnswer::Expired;
+    }
+    // The controller's own reckoning: when a lock-out ends is the domain's policy.
+    if (HasBit(entry, computed, lockout)) {
+        return AccountAnswer::LockedOut;
+    }
+    return AccountAnswer::InOrder;
+}
+
+AccountAnswer AskAboutAccount(std::string const& user, BoundedCall::Clock::time_point deadline) {
+    try {
+        return Ask(user, deadline);
+    } catch (std::exception const& failure) {
+        LogWarning("may '" + user + "' log in: " + failure.what());
+        return AccountAnswer::NoAnswer;
+    }
+}
+
+} // namespace tessel::winbind

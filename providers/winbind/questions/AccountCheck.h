@@ -1,0 +1,26 @@
+// SPDX-License-Identifier: Apache-2.0
+#pragma once
+
+#include "samba/DirectorySearch.h"
+#include "text/AccountAnswer.h"
+
+#include <chrono>
+#include <string>
+
+/// Whether the domain lets a user log in, for who asks without a password: a key, a ticket or a job
+/// is none of a controller's business, unless somebody asks.
+namespace tessel::winbind {
+
+/// What an account's attributes say. An account whose state the host may not read is `NoAnswer`.
+/// @param entry `userAccountControl`, `msDS-User-Account-Control-Computed` and `accountExpires`, as
+///     the directory has them (MS-ADTS 2.2.16, 3.1.1.4.5.17, MS-ADA1 2.2)
+/// @param now by the host's clock
+AccountAnswer StateOfAccount(DirectoryEntry const& entry,
+                             std::chrono::system_clock::time_point now);
+
+/// Asks winbindd who `user` is, a name in any form that the name service takes, and a controller of
+/// his domain for his account. Needs root. Blocks until `deadline` at the latest; every failure is
+/// `NoAnswer`, with its cause in the system log.
+AccountAnswer AskAboutAccount(std::string const& user, BoundedCall::Clock::time_point deadline);
+
+} // namespace tessel::winbind
