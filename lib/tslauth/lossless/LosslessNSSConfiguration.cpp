@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "LosslessNSSConfiguration.h"
 
-#include "Loss.h"
-#include "NSSMeaning.h"
+#include "analysis/Loss.h"
+#include "analysis/NSSMeaning.h"
 #include "WholeLines.h"
 #include "systemconfiguration/NSSConfigurationText.h"
 #include "systemconfiguration/Words.h"

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "LosslessPAMPolicy.h"
 
-#include "Loss.h"
-#include "PAMMeaning.h"
+#include "analysis/Loss.h"
+#include "analysis/PAMMeaning.h"
 #include "Paths.h"
 #include "WholeLines.h"
 #include "systemconfiguration/PAMPolicyText.h"
