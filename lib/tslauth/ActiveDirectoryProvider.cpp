@@ -136,7 +136,10 @@ ActiveDirectoryProvider::ActiveDirectoryProvider(std::string const& name)
     CacheMetadata();
 }
 
-ActiveDirectoryProvider::~ActiveDirectoryProvider() = default;
+ActiveDirectoryProvider::~ActiveDirectoryProvider() {
+    // The library goes before the texts, whose memory a provider's last functions may still see.
+    _library.reset();
+}
 
 void ActiveDirectoryProvider::CacheMetadata() {
     _pamModule = _metadata->pamModule;

@@ -162,6 +162,32 @@ bool ActiveDirectoryStore::_isGetStoreConfigThreadActive = false;
 bool ActiveDirectoryStore::_isGetTrustedDomainsThreadActive = false;
 bool ActiveDirectoryStore::_isGetTrustStateThreadActive = false;
 
+/// A fork copies neither the workers nor a thread that holds the lock, but the flags and the lock.
+/// Without these a child would wait for answers that nobody is asking for.
+struct ForkHandlers {
+    static void BeforeFork() {
+        pthread_mutex_lock(&ActiveDirectoryStore::_lock);
+    }
+    static void InParent() {
+        pthread_mutex_unlock(&ActiveDirectoryStore::_lock);
+    }
+    static void InChild() {
+        ActiveDirectoryStore::_isGetStoreConfigThreadActive = false;
+        ActiveDirectoryStore::_isGetTrustedDomainsThreadActive = false;
+        ActiveDirectoryStore::_isGetTrustStateThreadActive = false;
+        pthread_mutex_unlock(&ActiveDirectoryStore::_lock);
+    }
+};
+
+namespace {
+
+/// When the library is loaded. It fails only where there is no memory, and then the host goes on
+/// with what a fork gives it.
+[[maybe_unused]] int const forkHandlersRegistered =
+    pthread_atfork(&ForkHandlers::BeforeFork, &ForkHandlers::InParent, &ForkHandlers::InChild);
+
+} // namespace
+
 ActiveDirectoryStoreConfiguration::~ActiveDirectoryStoreConfiguration() = default;
 
 ActiveDirectoryStore::ActiveDirectoryStore(int timeout)

@@ -39,14 +39,12 @@ bool VerifiesCertificates() {
 }
 
 /// What `use(store)` returns, where `store` is the thumbprint store as it is now. A store that cannot
-/// be opened or replaced, or whose permissions could not be kept, is what has to be repaired.
+/// be opened or replaced is what has to be repaired.
 template <typename Use> auto WithThumbprintStore(Use use) {
     try {
         CAMThumbprintStore store(Paths::CAMThumbprintStore);
         return use(store);
     } catch (IOError const&) {
-        throw InvalidThumbprintStoreException(Paths::CAMThumbprintStore);
-    } catch (FilePermissionError const&) {
         throw InvalidThumbprintStoreException(Paths::CAMThumbprintStore);
     }
 }
@@ -81,6 +79,14 @@ void ActiveDirectoryStore::ImportCertificateForCAM(std::string const& certificat
     std::string const thumbprint = CertificateThumbprint(certificateFile);
     WithThumbprintStore(
         [&](CAMThumbprintStore& store) { store.ImportThumbprint(thumbprint, serverAddress); });
+}
+
+void ActiveDirectoryStore::PinCertificateForCAM(std::string const& certificateFile,
+                                                std::string const& serverAddress) {
+    CheckServerAddress(serverAddress);
+    std::string const thumbprint = CertificateThumbprint(certificateFile);
+    CAMThumbprintStore store(Paths::CAMThumbprintStore, OnReadError::Throw);
+    store.ImportThumbprint(thumbprint, serverAddress);
 }
 
 void ActiveDirectoryStore::JoinDomainWithCAM(std::string const& serverAddress,

@@ -4,10 +4,10 @@
 #include "Assertion.h"
 #include "SystemFile.h"
 
+#include <base/WholeFile.h>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <tslauth/Exceptions.h>
 #include <unistd.h>
@@ -28,18 +28,14 @@ int DescriptorOf(std::filebuf& buffer) {
     return Access::Number(buffer);
 }
 
-/// Makes the entries of the folder that holds `path` durable.
-void SyncDirectoryOf(std::string const& path) {
-    std::string::size_type const slash = path.rfind('/');
-    std::string const directory = slash == std::string::npos ? "." : path.substr(0, slash + 1);
-    int const opened = ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (opened < 0) {
-        return;
+/// Makes a file durable that is to take the place of another, with the mode of that one. A mode set
+/// after the sync could be lost in a crash that keeps the rename.
+bool SyncInPlaceOf(std::string const& target, int descriptor) {
+    struct stat old = {};
+    if (::stat(target.c_str(), &old) == 0) {
+        (void)::fchmod(descriptor, old.st_mode & 07777); // `Commit` finds out what fails here
     }
-    // Best effort, here and above: the target is in place and whole, some file systems refuse to
-    // sync a folder, and what a crash could undo is only the rename, back to the old whole file.
-    (void)::fsync(opened);
-    (void)::close(opened);
+    return ::fsync(descriptor) == 0;
 }
 
 /// Turns a stream's exceptions off for a scope: what they would report is checked, or is not meant
@@ -90,6 +86,7 @@ void AtomicFileStream::open(char const* path, std::ios::openmode mode) {
     (void)::close(created);
     _tempName = name;
     _targetName = path;
+    WithoutExceptions const quiet(*this);
     // What stays where the stream refuses a combination of modes without asking the system.
     errno = EINVAL;
     if (rdbuf()->open(_tempName, mode | std::ios::out)) {
@@ -109,7 +106,7 @@ void AtomicFileStream::Sync() {
         error = errno != 0 ? errno : EIO;
     } else if (!is_open()) {
         error = EBADF;
-    } else if (::fsync(DescriptorOf(*rdbuf())) != 0) {
+    } else if (!SyncInPlaceOf(_targetName, DescriptorOf(*rdbuf()))) {
         error = errno;
         setstate(std::ios::badbit);
     }
@@ -132,21 +129,18 @@ void AtomicFileStream::Commit() {
     if (!known && errno != ENOENT) {
         permissionError = SystemText(errno);
     }
-    mode_t const mode = old.st_mode & 07777;
-    if (known) {
-        // So that there is no moment at which who could read the old file cannot read the new one.
-        // A failure shows again, and is reported, at the same call after the rename.
-        (void)::chmod(_tempName.c_str(), mode);
-    }
 
     if (::rename(_tempName.c_str(), _targetName.c_str()) != 0) {
         int const error = errno;
+        // What is left behind is nobody's but ours, whatever mode `Sync` gave it.
+        (void)::chmod(_tempName.c_str(), 0600);
         ThrowIOError("Unable to rename '" + _tempName + "' to '" + _targetName + "'", error);
     }
-    if (known && ::chmod(_targetName.c_str(), mode) != 0) {
+    // Once more: the target's mode may be a later one than `Sync` saw, which need not have been called.
+    if (known && ::chmod(_targetName.c_str(), old.st_mode & 07777) != 0) {
         permissionError = SystemText(errno);
     }
-    SyncDirectoryOf(_targetName);
+    base::SyncFolderOf(_targetName);
     if (!permissionError.empty()) {
         throw FilePermissionError(
             "Failed to save file permissions, file permissions may be incorrect: " +

@@ -40,17 +40,19 @@ void Check(int code) {
 
 CAMProxy::CAMProxy(std::string const& providerName, std::string const& serverAddress,
                    bool verifyCertificate, std::string const& thumbprint)
+    : _library(nullptr, nullptr), _operations(nullptr), _verifyCertificate(verifyCertificate),
+      _server(serverAddress), _thumbprint(thumbprint) {
     // Global, because CAM providers load parts of their own that look for their symbols.
-    : _library(
-          LoadProvider(providerName, RTLD_LAZY | RTLD_GLOBAL, "Unable to open CAM provider: ")),
-      _operations(FindRecord<CAMProxyClientOperationsRecord>(_library, "CAMProxyClientOperations")),
-      _verifyCertificate(verifyCertificate), _server(serverAddress), _thumbprint(thumbprint) {
+    _library = LoadProvider(providerName, RTLD_LAZY | RTLD_GLOBAL, "Unable to open CAM provider: ");
+    _operations = FindRecord<CAMProxyClientOperationsRecord>(_library, "CAMProxyClientOperations");
     if (_operations == nullptr) {
         throw InvalidCAMProxyProviderException(providerName, LoaderError());
     }
 }
 
-CAMProxy::~CAMProxy() = default;
+CAMProxy::~CAMProxy() {
+    _library.reset(); // before the texts
+}
 
 void CAMProxy::GetDomainInfo(char** netBIOSName, char** dnsName, char** domainSID) const {
     Check(Implemented(_operations->getDomainInformation)(

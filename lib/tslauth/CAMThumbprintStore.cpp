@@ -5,6 +5,9 @@ namespace tessel::authentication {
 
 CAMThumbprintStore::CAMThumbprintStore(std::string const& path) : Configuration(path) {}
 
+CAMThumbprintStore::CAMThumbprintStore(std::string const& path, OnReadError onReadError)
+    : Configuration(path, onReadError) {}
+
 CAMThumbprintStore::~CAMThumbprintStore() = default;
 
 std::string CAMThumbprintStore::LookupThumbprint(std::string const& server) const {

@@ -18,8 +18,11 @@ void ThrowMissing(std::string const& key) {
 
 } // namespace
 
-Configuration::Configuration(std::string const& path) : _path(path) {
-    ReadAssignments(ReadFile(path, "Unable to open", OnReadError::EndQuietly), *this);
+Configuration::Configuration(std::string const& path)
+    : Configuration(path, OnReadError::EndQuietly) {}
+
+Configuration::Configuration(std::string const& path, OnReadError onReadError) : _path(path) {
+    ReadAssignments(ReadFile(path, "Unable to open", onReadError), *this);
 }
 
 Configuration::~Configuration() = default;
@@ -59,7 +62,7 @@ std::string const& Configuration::operator[](std::string const& key) const {
 }
 
 std::pair<std::string, std::string> GetKeyValuePair(std::string const& line, int lineNumber) {
-    Assignment const assignment = SplitLine(line, lineNumber);
+    base::Assignment const assignment = SplitLine(line, lineNumber);
     return {std::string(assignment.key), std::string(assignment.value)};
 }
 

@@ -2,22 +2,17 @@
 #ifndef TSLAUTH_CONFIGURATIONTEXT_H
 #define TSLAUTH_CONFIGURATIONTEXT_H
 
+#include <base/KeyValueText.h>
 #include <map>
 #include <string>
 #include <string_view>
 
-/// The form of the key-value files: text in, text out. No file is opened here.
+/// The library's own key-value files: text in, text out. No file is opened here.
 namespace tessel::authentication {
-
-/// One assignment of a file, as pieces of its text.
-struct Assignment {
-    std::string_view key;
-    std::string_view value;
-};
 
 /// @param line one that is not blank, without its line feed
 /// @throws ConfigurationError
-Assignment SplitLine(std::string_view line, int lineNumber);
+base::Assignment SplitLine(std::string_view line, int lineNumber);
 
 /// Adds the assignments of a whole file to an empty map; the first of a key wins.
 /// @throws ConfigurationError at the first bad line
@@ -25,7 +20,7 @@ void ReadAssignments(std::string_view text, std::map<std::string, std::string>& 
 
 /// Makes `line` the line of an assignment. Its length is known first, because growing it piece by
 /// piece takes longer than everything else that a line costs besides its system call.
-void AssignLine(std::string& line, Assignment const& assignment);
+void AssignLine(std::string& line, base::Assignment const& assignment);
 
 } // namespace tessel::authentication
 

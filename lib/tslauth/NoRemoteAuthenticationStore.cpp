@@ -15,6 +15,8 @@ namespace tessel::authentication {
 
 namespace {
 
+constexpr char DisplayName[] = "None";
+
 /// A store by name, from the process's factory; a program that made none gets one for the call.
 std::auto_ptr<AuthenticationStore> CreateStore(std::string const& name) {
     if (AuthenticationStoreFactory* const factory = AuthenticationStoreFactory::Instance()) {
@@ -33,7 +35,7 @@ std::auto_ptr<StoreConfiguration> NoRemoteAuthenticationStore::GetStoreConfigura
 }
 
 std::string NoRemoteAuthenticationStore::GetDisplayName() const {
-    return "None";
+    return DisplayName;
 }
 
 void NoRemoteAuthenticationStore::MakeActive() {
@@ -43,7 +45,8 @@ void NoRemoteAuthenticationStore::MakeActive() {
         return;
     }
     std::string const previous = recorded;
-    recorded = GetDisplayName();
+    // Not what a class derived from this one calls itself: the host is local from here on.
+    recorded = DisplayName;
     // Before the withdrawal, not after it: a store that cannot be withdrawn would otherwise keep
     // the host from ever becoming local again.
     configuration.Write();

@@ -9,7 +9,9 @@ namespace tessel::authentication {
 
 bool RemoteAuthenticationStore::IsActive() const {
     AuthenticationConfiguration const configuration;
-    return configuration[Paths::RemoteAuthenticationStoreKey] == GetDisplayName();
+    // Before the key, on every compiler: the name is told by a class that may be a caller's own.
+    std::string const name = GetDisplayName();
+    return configuration[Paths::RemoteAuthenticationStoreKey] == name;
 }
 
 RemoteAuthenticationStore::~RemoteAuthenticationStore() = default;

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <limits>
 #include <sys/time.h>
+#include <utility>
 
 namespace tessel::authentication {
 
@@ -46,7 +47,12 @@ void RequestState::Done(Exception const* failure) noexcept {
     _done = true;
     if (failure) {
         try {
-            _failure.reset(failure->Clone());
+            std::unique_ptr<Exception> clone(failure->Clone());
+            if (clone == _failure) {
+                (void)clone.release(); // one that clones itself to what is kept already
+            } else {
+                _failure = std::move(clone);
+            }
         } catch (...) {
             _failureLost = true;
         }
@@ -56,20 +62,28 @@ void RequestState::Done(Exception const* failure) noexcept {
 
 void RequestState::WaitResult(int timeoutSeconds) {
     timespec const deadline = DeadlineIn(timeoutSeconds);
-    MutexLock const lock(_mutex);
-    while (!_done) {
-        int const error = pthread_cond_timedwait(&_condition, &_mutex, &deadline);
-        if (error == ETIMEDOUT) {
-            throw ProviderCallTimedOutException("Provider call timed out.");
+    int error = 0;
+    Exception const* failure = nullptr;
+    bool failureLost = false;
+    {
+        MutexLock const lock(_mutex);
+        while (!_done && error == 0) {
+            error = pthread_cond_timedwait(&_condition, &_mutex, &deadline);
         }
-        if (error != 0) {
-            ThrowThreadError("pthread_cond_timedwait failed. RC=", error);
-        }
+        failure = _failure.get();
+        failureLost = _failureLost;
     }
-    if (_failure) {
-        _failure->Throw();
+    // Nothing is thrown under the mutex: the code of a failure's own class may come back here.
+    if (error == ETIMEDOUT) {
+        throw ProviderCallTimedOutException("Provider call timed out.");
     }
-    if (_failureLost) {
+    if (error != 0) {
+        ThrowThreadError("pthread_cond_timedwait failed. RC=", error);
+    }
+    if (failure) {
+        failure->Throw();
+    }
+    if (failureLost) {
         ThrowMappedException(TSLAUTH_PROVIDER_INTERNAL_ERROR);
     }
 }

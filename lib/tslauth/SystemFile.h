@@ -2,32 +2,29 @@
 #ifndef TSLAUTH_SYSTEMFILE_H
 #define TSLAUTH_SYSTEMFILE_H
 
+#include <base/FileError.h>
 #include <string>
 #include <string_view>
+#include <tslauth/Configuration.h>
 
 /// The one place where the library reads a whole file, replaces one, or turns an error number into
 /// an exception. Nothing here holds state, so everything may be called from any thread; reading and
 /// replacing block as long as the file system does.
 namespace tessel::authentication {
 
-/// The system's text for an error number, as `strerror` gives it, but safe with threads.
-std::string SystemText(int error);
+using base::SystemText;
 
 /// Throws `IOError` with `what` + ": " + the system's text for `error`.
 [[noreturn]] void ThrowIOError(std::string const& what, int error);
 
-enum class OnReadError {
-    /// What was read before the error is the result, as it is with an input stream.
-    EndQuietly,
-    /// `IOError` "Cannot read '" + path + "': " + the system's text. For files that are written
-    /// back, which an error in the middle must not shorten.
-    Throw,
-};
-
-/// The bytes of a file.
+/// The bytes of a regular file. What else stands at the path is refused, and a pipe not waited for.
+/// Only a folder is read with `OnReadError::EndQuietly`: it opens like a file, and the reading ends
+/// at once.
 /// @param openFailure how the message for a file that cannot be opened begins:
 ///        openFailure + " '" + path + "': " + the system's text
-/// @throws IOError if the file cannot be opened or, as `onReadError` says, read
+/// @throws IOError if the file cannot be opened, is none ("Cannot read '" + path + "': it is not a
+///         regular file") or, as `onReadError` says, cannot be read ("Cannot read '" + path + "': " +
+///         the system's text)
 std::string ReadFile(std::string const& path, char const* openFailure = "Cannot open",
                      OnReadError onReadError = OnReadError::Throw);
 

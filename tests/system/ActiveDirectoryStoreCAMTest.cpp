@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Failure.h"
 #include "JoinableHost.h"
+#include "faults/Faults.h"
 #include "providers/CAMRecording.h"
 
 #include <strandctl/HostCtlException.h>
@@ -254,10 +255,12 @@ TEST_F(ActiveDirectoryStoreCAMTest, StoreThatCannotBeReplacedIsInvalidAndStaysAs
     EXPECT_EQ(before, Host::Read(Paths::CAMThumbprintStore));
 }
 
-TEST_F(ActiveDirectoryStoreCAMTest, StoreWhosePermissionsCannotBeKeptIsInvalidAsWell) {
+TEST_F(ActiveDirectoryStoreCAMTest, PermissionsThatCannotBeKeptAreReportedAsSuch) {
     std::string const thumbprint = MakeCertificate();
     permissionsAreRefused = true;
-    EXPECT_EQ(BadStore(), ImportFailure());
+    EXPECT_EQ(Plain<FilePermissionError>("Failed to save file permissions, file permissions may be "
+                                         "incorrect: Operation not permitted"),
+              ImportFailure());
     EXPECT_EQ("192.0.2.20 = \"" + thumbprint + "\"\n", Host::Read(Paths::CAMThumbprintStore))
         << "it was replaced all the same";
 }
@@ -269,6 +272,59 @@ TEST_F(ActiveDirectoryStoreCAMTest, MalformedStoreIsAConfigurationError) {
         Plain<ConfigurationError>("Error parsing configuration on line 1: no delimiter found");
     EXPECT_EQ(malformed, ImportFailure());
     EXPECT_EQ(malformed, JoinFailure());
+}
+
+TEST_F(ActiveDirectoryStoreCAMTest, PinningReplacesTheOneThumbprintAsImportingDoes) {
+    std::string const thumbprint = MakeCertificate();
+    Host::Write(Paths::CAMThumbprintStore, "192.0.2.20 = \"0A:1B\"\n192.0.2.21 = \"2C\"\n");
+    Store().PinCertificateForCAM(Certificate, Server);
+    EXPECT_EQ("192.0.2.20 = \"" + thumbprint + "\"\n192.0.2.21 = \"2C\"\n",
+              Host::Read(Paths::CAMThumbprintStore));
+    EXPECT_EQ(BadAddress("x"), FailureOf([&] { Store().PinCertificateForCAM(Certificate, "x"); }));
+    ASSERT_EQ(0, unlink(Paths::CAMThumbprintStore));
+    EXPECT_EQ(
+        Plain<IOError>("Unable to open '/etc/tessel/tslauth/camservers.conf': No such file or "
+                       "directory"),
+        FailureOf([&] { Store().PinCertificateForCAM(Certificate, Server); }));
+}
+
+TEST_F(ActiveDirectoryStoreCAMTest, PinningLosesNoThumbprintToAReadError) {
+    if (!faults::Available()) {
+        GTEST_SKIP() << "this kernel does not let a process be watched";
+    }
+    std::string const thumbprint = MakeCertificate();
+    std::string const before = "192.0.2.20 = \"0A:1B\"\n192.0.2.21 = \"2C\"\n";
+    std::string const after = "192.0.2.20 = \"" + thumbprint + "\"\n192.0.2.21 = \"2C\"\n";
+    // Fails the reads that `call` makes, one after the other, and tells `tried` what came of it.
+    auto const failEachRead = [&](auto call, auto tried) {
+        for (std::size_t read = 1;; ++read) {
+            Host::Write(Paths::CAMThumbprintStore, before);
+            faults::Outcome const outcome =
+                faults::RunWithFaultIn("read", faults::FailsWith(EIO), call, read, 1);
+            if (!outcome.injected) {
+                return;
+            }
+            tried(outcome);
+        }
+    };
+    ActiveDirectoryStore store(60);
+    int refused = 0;
+    failEachRead([&] { store.PinCertificateForCAM(Certificate, Server); },
+                 [&](faults::Outcome const& outcome) {
+                     EXPECT_NE("", outcome.exception);
+                     EXPECT_EQ(before, Host::Read(Paths::CAMThumbprintStore)) << outcome.message;
+                     refused += outcome.message == "Cannot read '/etc/tessel/tslauth/"
+                                                   "camservers.conf': Input/output error";
+                 });
+    EXPECT_EQ(2, refused);
+    // What importing does instead is part of its contract.
+    int lost = 0;
+    failEachRead([&] { store.ImportCertificateForCAM(Certificate, Server); },
+                 [&](faults::Outcome const& outcome) {
+                     std::string const now = Host::Read(Paths::CAMThumbprintStore);
+                     lost += outcome.exception.empty() && now != after;
+                 });
+    EXPECT_EQ(1, lost);
 }
 
 // ---- Joining ------------------------------------------------------------------------------------

@@ -553,7 +553,7 @@ TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
     ASSERT_EQ(0, unlink(Paths::PAMPolicy));
     ASSERT_EQ(0, mkdir(Paths::PAMPolicy, 0755));
     EXPECT_THROW(Activate(), IOError);
-    EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': Is a directory",
+    EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': it is not a regular file",
               ActivationFailure());
     ASSERT_EQ(0, rmdir(Paths::PAMPolicy));
 }

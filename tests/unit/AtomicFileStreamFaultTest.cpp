@@ -5,6 +5,7 @@
 
 #include "SystemFile.h"
 
+#include <algorithm>
 #include <csignal>
 #include <gmock/gmock.h>
 #include <sys/resource.h>
@@ -55,8 +56,8 @@ TEST_F(AtomicFileStreamFaultTest, AReplacementMakesExactlyTheseCalls) {
     EXPECT_TRUE(outcome.finished);
     EXPECT_EQ("", outcome.message);
     EXPECT_THAT(outcome.calls,
-                testing::ElementsAre("open", "close", "open", "write", "fsync", "close", "stat",
-                                     "chmod", "rename", "chmod", "open", "fsync", "close"));
+                testing::ElementsAre("open", "close", "open", "write", "stat", "chmod", "fsync",
+                                     "close", "stat", "rename", "chmod", "open", "fsync", "close"));
     ExpectNew();
     EXPECT_EQ(0644U, ModeOf(target));
 }
@@ -77,7 +78,7 @@ TEST_F(AtomicFileStreamFaultTest, WhicheverCallFailsTheTargetIsWholeAndTheCaller
                     ExpectNew();
                 }
             });
-        EXPECT_EQ(13U, calls);
+        EXPECT_EQ(14U, calls);
     }
 }
 
@@ -87,7 +88,7 @@ TEST_F(AtomicFileStreamFaultTest, WhereverTheProcessIsKilledTheTargetIsWhole) {
         [&](std::size_t place, faults::Outcome const& outcome) {
             SCOPED_TRACE("call " + std::to_string(place) + ", " + outcome.calls[place - 1]);
             EXPECT_FALSE(outcome.finished);
-            std::size_t const rename = 9;
+            std::size_t const rename = 10;
             if (place <= rename) {
                 ExpectOld();
             } else {
@@ -95,7 +96,7 @@ TEST_F(AtomicFileStreamFaultTest, WhereverTheProcessIsKilledTheTargetIsWhole) {
                 EXPECT_EQ(0644U, ModeOf(target));
             }
         });
-    EXPECT_EQ(13U, calls);
+    EXPECT_EQ(14U, calls);
 }
 
 TEST_F(AtomicFileStreamFaultTest, ATemporaryFileThatCannotBeCreatedIsReported) {
@@ -194,8 +195,45 @@ TEST_F(AtomicFileStreamFaultTest, TheNewFileNeverLacksTheOldMode) {
     EXPECT_EQ(0644U, ModeOf(target));
 }
 
+TEST_F(AtomicFileStreamFaultTest, TheModeIsDurableWithTheContents) {
+    faults::Outcome const outcome = faults::RunWithFaultAt(0, faults::Killed(), replace);
+    auto const chmod = std::find(outcome.calls.begin(), outcome.calls.end(), "chmod");
+    auto const fsync = std::find(outcome.calls.begin(), outcome.calls.end(), "fsync");
+    auto const rename = std::find(outcome.calls.begin(), outcome.calls.end(), "rename");
+    EXPECT_LT(chmod, fsync);
+    EXPECT_LT(fsync, rename);
+    EXPECT_NE(rename, outcome.calls.end());
+}
+
+TEST_F(AtomicFileStreamFaultTest, AFileLeftBehindByAFailedRenameHasMode0600) {
+    for (auto const& operation : {replace, replaceWithoutSync}) {
+        faults::Outcome const outcome =
+            faults::RunWithFaultIn("rename", faults::FailsWith(EIO), operation);
+        ExpectIOError(outcome, "Unable to rename '" + Temporary() + "' to '" + target +
+                                   "': Input/output error");
+        EXPECT_EQ(0600U, ModeOf(Temporary()));
+        Reset();
+    }
+}
+
+TEST_F(AtomicFileStreamFaultTest, AFailedReopenThrowsNothingWhateverTheMask) {
+    faults::Outcome const outcome = faults::RunWithFaultIn(
+        "open", faults::FailsWith(EMFILE),
+        [&] {
+            AtomicFileStream stream((folder / "other").c_str(), std::ios::out);
+            stream.close();
+            stream.exceptions(std::ios::failbit | std::ios::badbit);
+            stream.open(target.c_str(), std::ios::out);
+            bool const kept = stream.exceptions() == (std::ios::failbit | std::ios::badbit);
+            throw std::runtime_error(stream.fail() && kept ? "fail state" : "no fail state");
+        },
+        4, 1);
+    EXPECT_TRUE(outcome.injected);
+    EXPECT_EQ("fail state", outcome.message);
+}
+
 TEST_F(AtomicFileStreamFaultTest, AFolderThatCannotBeSyncedDoesNotMatter) {
-    for (std::size_t const place : {11U, 12U, 13U}) {
+    for (std::size_t const place : {12U, 13U, 14U}) {
         faults::Outcome const outcome =
             faults::RunWithFaultAt(place, faults::FailsWith(EINVAL), replace);
         EXPECT_TRUE(outcome.injected);

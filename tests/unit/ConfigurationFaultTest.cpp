@@ -38,8 +38,8 @@ TEST_F(ConfigurationFaultTest, ReadingAndWritingMakesExactlyTheseCalls) {
                 testing::ElementsAre("open", "stat", "read", "read", "close", // the reading
                                      "open", "close", "open",                 // the temporary file
                                      "write", "write", "write",               // a line each
-                                     "fsync", "close", "stat", "chmod", "rename", "chmod", "open",
-                                     "fsync", "close"));
+                                     "stat", "chmod", "fsync", "close", // what makes it durable
+                                     "stat", "rename", "chmod", "open", "fsync", "close"));
     EXPECT_EQ(newText, Contents(target));
 }
 
@@ -74,7 +74,7 @@ TEST_F(ConfigurationFaultTest, WhicheverCallFailsTheFileIsWholeAndTheCallerKnows
                                                "tessel::authentication::InvalidKeyException"));
                 }
             });
-        EXPECT_EQ(20U, calls);
+        EXPECT_EQ(21U, calls);
     }
 }
 
@@ -84,11 +84,11 @@ TEST_F(ConfigurationFaultTest, WhereverTheProcessIsKilledTheFileIsWhole) {
         [&](std::size_t place, faults::Outcome const& outcome) {
             SCOPED_TRACE("call " + std::to_string(place) + ", " + outcome.calls[place - 1]);
             EXPECT_FALSE(outcome.finished);
-            std::size_t const rename = 16;
+            std::size_t const rename = 17;
             EXPECT_EQ(place <= rename ? oldText : newText, Contents(target));
             EXPECT_EQ(0644U, ModeOf(target));
         });
-    EXPECT_EQ(20U, calls);
+    EXPECT_EQ(21U, calls);
 }
 
 TEST_F(ConfigurationFaultTest, AnOpenThatFailsIsReportedWithItsReason) {
@@ -113,6 +113,17 @@ TEST_F(ConfigurationFaultTest, WhatWasReadBeforeAReadErrorIsKept) {
         [&] { throw std::runtime_error(std::to_string(Configuration(target).size())); }, 2);
     EXPECT_TRUE(outcome.injected);
     EXPECT_EQ("3", outcome.message);
+}
+
+TEST_F(ConfigurationFaultTest, WhoWritesTheFileBackIsToldOfAReadError) {
+    for (std::size_t const call : {1U, 2U}) {
+        faults::Outcome const outcome = faults::RunWithFaultIn(
+            "read", faults::FailsWith(EIO), [&] { Configuration(target, OnReadError::Throw); },
+            call, 1);
+        EXPECT_TRUE(outcome.injected);
+        EXPECT_EQ("tessel::authentication::IOError", outcome.exception);
+        EXPECT_EQ("Cannot read '" + target + "': Input/output error", outcome.message);
+    }
 }
 
 TEST_F(ConfigurationFaultTest, AnInterruptedReadIsRepeated) {

@@ -137,6 +137,18 @@ TEST_F(ConfigurationTest, WriteKeepsTheModeOfTheFile) {
     }
 }
 
+TEST_F(ConfigurationTest, AFolderIsEmptyToWhoOnlyReadsAndRefusedToWhoWritesBack) {
+    EXPECT_TRUE(Configuration(folder.Path()).empty());
+    EXPECT_EQ("Cannot read '" + folder.Path() + "': it is not a regular file",
+              MessageOf<IOError>([&] { Configuration(folder.Path(), OnReadError::Throw); }));
+}
+
+TEST_F(ConfigurationTest, APipeIsRefusedAndNotWaitedFor) {
+    ASSERT_EQ(0, ::mkfifo(path.c_str(), 0600));
+    EXPECT_EQ("Cannot read '" + path + "': it is not a regular file",
+              MessageOf<IOError>([&] { Configuration{path}; }));
+}
+
 TEST_F(ConfigurationTest, WriteCreatesAFileThatIsGone) {
     Configuration configuration = Read("a=1\n");
     configuration.emplace("key", "value");

@@ -12,7 +12,9 @@
 #include <cerrno>
 #include <chrono>
 #include <deque>
+#include <future>
 #include <limits>
+#include <memory>
 #include <pthread.h>
 #include <string>
 #include <thread>
@@ -133,6 +135,69 @@ TEST(RequestState, FailureThatCannotBeKeptIsNotTakenForSuccess) {
         EXPECT_THROW(state.WaitResult(0), InternalErrorException);
         EXPECT_EQ(InternalError, MessageOf(state, 0));
     }
+}
+
+namespace {
+
+/// Calls back into the state that throws it, as a class of a caller's may.
+struct CallsBack : Exception {
+    CallsBack(RequestState& state, bool& finished)
+        : Exception("x"), _state(state), _finished(finished) {}
+    Exception* Clone() const override {
+        return new CallsBack(*this);
+    }
+    void Throw() const override {
+        // From another thread, so that a mutex that is held keeps it waiting and not this test.
+        auto const done = std::make_shared<std::promise<void>>();
+        std::thread([done, &state = _state] {
+            state.Done(nullptr);
+            done->set_value();
+        }).detach();
+        _finished =
+            done->get_future().wait_for(std::chrono::seconds(5)) == std::future_status::ready;
+        throw CallsBack(*this);
+    }
+
+private:
+    RequestState& _state;
+    bool& _finished;
+};
+
+/// Is its own copy, and says when it goes.
+struct ItsOwnClone : Exception {
+    explicit ItsOwnClone(bool& gone) : Exception("x"), _gone(gone) {}
+    ~ItsOwnClone() override {
+        _gone = true;
+    }
+    Exception* Clone() const override {
+        return const_cast<ItsOwnClone*>(this);
+    }
+
+private:
+    bool& _gone;
+};
+
+} // namespace
+
+TEST(RequestState, FailureIsThrownWithoutTheMutex) {
+    RequestState state;
+    bool finished = false;
+    CallsBack const failure(state, finished);
+    state.Done(&failure);
+    EXPECT_THROW(state.WaitResult(0), CallsBack);
+    EXPECT_TRUE(finished);
+}
+
+TEST(RequestState, FailureThatIsKeptAlreadyStaysAlive) {
+    bool gone = false;
+    {
+        RequestState state;
+        auto* const failure = new ItsOwnClone(gone); // the state's from the first call on
+        state.Done(failure);
+        state.Done(failure);
+        EXPECT_FALSE(gone);
+    }
+    EXPECT_TRUE(gone);
 }
 
 TEST(RequestState, WaiterThatGivesUpLeavesTheWorkerItsState) {

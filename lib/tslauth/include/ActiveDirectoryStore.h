@@ -29,6 +29,9 @@ namespace authentication {
 /// no domain controller answers: those run on a worker thread, at most one a question in the whole
 /// process, and are answered from the last answer when the provider is slower than the store's
 /// timeout. A store may be destroyed while its workers run. Activating is for one thread at a time.
+///
+/// A process may fork while workers run: the child has none of them, keeps the last answers, and its
+/// stores ask anew, as far as the provider itself can be used in such a child.
 class TSLAUTH_EXPORT ActiveDirectoryStore : public DirectoryStore {
 public:
     /// Loads the provider that `provider.conf` names.
@@ -149,11 +152,21 @@ public:
     /// @throws FileNotFoundException (code 2) if the certificate's file cannot be opened
     /// @throws InvalidCertificateException if it holds no certificate in PEM form
     /// @throws InvalidThumbprintStoreException if the store cannot be opened or replaced; it is not
-    ///     created where it does not exist. Also if it was replaced but may have the wrong
-    ///     permissions; the thumbprint stands in it then
+    ///     created where it does not exist
+    /// @throws FilePermissionError if it was replaced but may have the wrong permissions; the
+    ///     thumbprint stands in it then
     /// @throws ConfigurationError where a line of the store is malformed
+    ///
+    /// A read error ends the reading of the store quietly, and what was not read is not written
+    /// back: `PinCertificateForCAM` loses no other server's thumbprint.
     void ImportCertificateForCAM(std::string const& certificateFile,
                                  std::string const& serverAddress);
+
+    /// `ImportCertificateForCAM` for callers that would rather fail than write back a store that
+    /// could not be read whole.
+    /// @throws as there, but IOError with its reason where the store cannot be opened, read to its
+    ///     end or replaced; it is as it was then
+    void PinCertificateForCAM(std::string const& certificateFile, std::string const& serverAddress);
 
     /// Joins the host without an administrator's credentials: the CAM server at `serverAddress`
     /// makes the machine account and tells about its domain, and the provider joins with both.
@@ -223,6 +236,7 @@ private:
     static bool _isGetStoreConfigThreadActive;
     static bool _isGetTrustedDomainsThreadActive;
     static bool _isGetTrustStateThreadActive;
+    friend struct ForkHandlers;
 };
 
 } // namespace authentication

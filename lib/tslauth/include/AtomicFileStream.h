@@ -39,7 +39,8 @@ public:
     ~AtomicFileStream() override;
 
     /// Creates the temporary file, with permissions 0600, and opens the stream on it. If only that
-    /// second step fails, the stream's fail state is set and `errno` says why.
+    /// second step fails, the stream's fail state is set and `errno` says why; nothing is thrown
+    /// then, whatever the stream's exception mask.
     /// @param path the target, which need not exist; at most 4088 bytes
     /// @param mode some flag besides `std::ios::in`, usually `std::ios::out`, which is added in any
     ///        case; without one the process ends with an assertion report
@@ -47,7 +48,8 @@ public:
     void open(char const* path, std::ios::openmode mode);
 
     /// Brings everything that was inserted onto the disk, and proves it: the last chance to give up
-    /// while the target is untouched.
+    /// while the target is untouched. The temporary file gets the target's mode with it, so that
+    /// after a crash the target is never there without it; a failed `Commit` takes it back.
     ///
     /// The reason in the message is right when no other call came between a failed insertion and
     /// this one.
@@ -59,7 +61,7 @@ public:
     /// (07777). A new target has the permissions 0600. The folder's change is asked onto the disk
     /// before this returns. To be called once.
     /// @throws IOError "Unable to rename '" + temporary + "' to '" + path + "': " + reason; the
-    ///         target is untouched and the temporary file stays
+    ///         target is untouched and the temporary file stays, with permissions 0600
     /// @throws FilePermissionError the target is replaced, but its mode could not be read or set
     void Commit();
 

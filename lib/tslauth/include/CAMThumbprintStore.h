@@ -18,6 +18,10 @@ public:
     /// @throws IOError if it cannot be opened
     /// @throws ConfigurationError at its first bad line
     explicit CAMThumbprintStore(std::string const& path);
+
+    /// The same, with a choice for who imports into it; see `Configuration`.
+    CAMThumbprintStore(std::string const& path, OnReadError onReadError);
+
     CAMThumbprintStore(CAMThumbprintStore const&) = default;
     CAMThumbprintStore& operator=(CAMThumbprintStore const&) = default;
     ~CAMThumbprintStore() override;

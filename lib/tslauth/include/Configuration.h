@@ -11,6 +11,14 @@
 namespace tessel {
 namespace authentication {
 
+/// What becomes of an error that comes when a file is open and read in part.
+enum class OnReadError {
+    /// It ends the text there, as it does with an input stream.
+    EndQuietly,
+    /// It is reported. For files that are written back: an error must not shorten them.
+    Throw,
+};
+
 /// One of the library's own configuration files: `key = "value"` lines, read into a sorted map.
 ///
 /// The format has no comments, no escapes and no sections. A line is split at its first "="; blanks
@@ -23,10 +31,16 @@ namespace authentication {
 class TSLAUTH_EXPORT Configuration : public std::map<std::string, std::string> {
 public:
     /// Reads the file. An error after it was opened ends the reading and is not reported.
-    /// @throws IOError "Unable to open '" + path + "': " + the system's text
+    /// @throws IOError "Unable to open '" + path + "': " + the system's text; "Cannot read '" + path +
+    ///         "': it is not a regular file" for a pipe or a device, neither of which is waited for
     /// @throws ConfigurationError as `GetKeyValuePair`, at the first bad line; lines are counted
     ///         from 1, the skipped ones included
     explicit Configuration(std::string const& path);
+
+    /// The same, with a choice for who writes the file back.
+    /// @throws as above; with `OnReadError::Throw` also IOError "Cannot read '" + path + "': " + the
+    ///         reason, for an error after the file was opened and for a folder
+    Configuration(std::string const& path, OnReadError onReadError);
     Configuration(Configuration const&) = default;
     Configuration& operator=(Configuration const&) = default;
 
