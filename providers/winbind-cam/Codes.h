@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "../winbind/tslauth_winbind_provider.h"
+
 #include <tslauth/tslauth_provider.h>
 
 /// The codes of this provider; README.md tells an administrator what to do about each. The
@@ -24,6 +26,6 @@ inline constexpr Code ServiceFailed = 1359;
 inline constexpr Code TooManyAttempts = 1909;
 inline constexpr Code TimedOut = 10060;
 inline constexpr Code InvalidCertificate = 0x80090325;
-inline constexpr Code Unknown = 0xFFFF0000;
+inline constexpr Code Unknown = TSLAUTH_WINBIND_SEE_SYSTEM_LOG;
 
 } // namespace tessel::winbind::cam::Codes

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "tslauth_winbind_provider.h"
+
 #include <tslauth/tslauth_provider.h>
 
 #include <exception>
@@ -8,13 +10,8 @@
 
 namespace tessel::winbind {
 
-/// A failure that no number of the table names: its text is in the system log.
-inline constexpr ActiveDirectoryClientErrorCode SeeSystemLog = 0xFFFF0000;
-/// A join was accepted by the controller, could not be finished here, and could not be undone there:
-/// the host is as it was, and the log names what may be left in the directory.
-inline constexpr ActiveDirectoryClientErrorCode HalfDone = 0xFFFF0001;
-
-/// What ends an operation of the provider: the code that its caller gets, and a text for the
+/// What ends an operation of the provider: the code that its caller gets, one of
+/// tslauth_provider.h or TSLAUTH_WINBIND_..., and a text for the
 /// system log, which names the object and holds no secret.
 class Failure : public std::exception {
 public:

@@ -33,9 +33,8 @@ inline constexpr char Lock[] = "/run/tslauth-winbind.lock";
 /// A folder of each join and part, with six more characters. Its owner alone can look into it.
 inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";
 
-/// Names of files that are on their way to their place, or kept until it is sure that they are not
-/// needed again, begin so.
-inline constexpr char TemporaryPrefix[] = ".tslauth-";
+/// Names of files that are kept until it is sure that they are not needed again end so; they begin
+/// like those of files that are on their way to their place.
 inline constexpr char OriginalSuffix[] = ".original";
 
 /// Tells the PAM module whether the domain lets a user log in; installed beside the provider.

@@ -84,9 +84,17 @@ enum {
 /* Samba's tools failed in a way that has no number; their own text is in the system log. */
 #define TSLAUTH_WINBIND_SEE_SYSTEM_LOG UINT32_C(0xFFFF0000)
 
-/* The controller has made the host's account, the host could not be set up, and the account could
- * not be deleted again. The host is as it was; the system log names what is left on the controller. */
-#define TSLAUTH_WINBIND_HALF_DONE UINT32_C(0xFFFF0001)
+/* A join was accepted by the controller, could not be finished on the host, and could not be undone
+ * in the directory: it may keep the host's account, as the system log says. The host is as it was. */
+#define TSLAUTH_WINBIND_ACCOUNT_LEFT UINT32_C(0xFFFF0001)
+
+/* A join, a part or a change failed, and the host is not as it was: what could not be taken back, or
+ * was not finished, is named in the system log. The directory may not be as it was either. */
+#define TSLAUTH_WINBIND_HOST_CHANGED UINT32_C(0xFFFF0002)
+
+/* Not enough room on the host's disks; in the numbering of tslauth_provider.h, which has no class
+ * for it. Nothing was changed. */
+#define TSLAUTH_WINBIND_DISK_FULL UINT32_C(112)
 
 #ifdef __cplusplus
 }

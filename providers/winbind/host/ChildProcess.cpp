@@ -2,9 +2,11 @@
 #include "host/ChildProcess.h"
 
 #include "Failure.h"
+#include "host/HostFile.h"
 
 #include <algorithm>
 #include <array>
+#include <base/Descriptor.h>
 #include <cerrno>
 #include <csignal>
 #include <fcntl.h>
@@ -15,7 +17,6 @@
 #include <sys/syscall.h>
 #include <sys/types.h>
 #include <sys/wait.h>
-#include <system_error>
 #include <unistd.h>
 
 namespace tessel::winbind {
@@ -37,49 +38,17 @@ struct Report {
     int value;
 };
 
-class Descriptor {
-public:
-    explicit Descriptor(int number = -1) : _number(number) {}
-    Descriptor(Descriptor const&) = delete;
-    Descriptor& operator=(Descriptor const&) = delete;
-    ~Descriptor() {
-        Close();
-    }
-    void Set(int number) {
-        _number = number;
-    }
-    void Close() {
-        if (_number >= 0) {
-            (void)::close(_number); // pipes and /dev/null lose nothing
-            _number = -1;
-        }
-    }
-    int Number() const {
-        return _number;
-    }
-
-private:
-    int _number;
-};
-
-[[noreturn]] void ThrowSystem(std::string const& what, int error) {
-    throw Failure(error == ENOMEM
-                      ? ActiveDirectoryClientErrorCode{TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY}
-                      : SeeSystemLog,
-                  what + ": " + std::generic_category().message(error));
-}
-
 struct Pipe {
     Pipe() {
         std::array<int, 2> ends = {};
         if (::pipe2(ends.data(), O_CLOEXEC) != 0) {
-            ThrowSystem("cannot make a pipe", errno);
+            ThrowSystemFailure("cannot make a pipe", errno);
         }
-        reading.Set(ends[0]);
-        writing.Set(ends[1]);
+        reading = base::Descriptor(ends[0]);
+        writing = base::Descriptor(ends[1]);
     }
-    Descriptor reading;
-    Descriptor writing;
+    base::Descriptor reading;
+    base::Descriptor writing;
 };
 
 /// All signals, so that no handler of the host's runs in a child that shares its memory's contents.
@@ -334,18 +303,17 @@ ChildProcess::Outcome ChildProcess::Run(Task const& task, Clock::time_point dead
         throw Failure(TSLAUTH_PROVIDER_SERVICE_DOES_NOT_EXIST,
                       "the program '" + program + "' is not installed");
     }
-    Descriptor const input(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-    if (input.Number() < 0) {
-        ThrowSystem("cannot open '/dev/null'", errno);
+    base::Descriptor const input(::open("/dev/null", O_RDONLY | O_CLOEXEC));
+    if (!input) {
+        ThrowSystemFailure("cannot open '/dev/null'", errno);
     }
     Pipe output;
     Pipe report;
-    std::vector<int> descriptors = {input.Number(), output.writing.Number(),
-                                    output.writing.Number()};
+    std::vector<int> descriptors = {input.Get(), output.writing.Get(), output.writing.Get()};
     for (SecretFile const* const secret : task.secrets) {
         descriptors.push_back(secret->Descriptor());
     }
-    descriptors.push_back(report.writing.Number());
+    descriptors.push_back(report.writing.Get());
     std::vector<char*> const arguments = Pointers(task.arguments);
     std::vector<std::string> variables = {searchPath, "LC_ALL=C"};
     variables.insert(variables.end(), task.environment.begin(), task.environment.end());
@@ -370,7 +338,7 @@ ChildProcess::Outcome ChildProcess::Run(Task const& task, Clock::time_point dead
         error = errno;
     }
     if (made < 0) {
-        ThrowSystem("cannot start '" + program + "'", error);
+        ThrowSystemFailure("cannot start '" + program + "'", error);
     }
     output.writing.Close();
     report.writing.Close();
@@ -378,8 +346,8 @@ ChildProcess::Outcome ChildProcess::Run(Task const& task, Clock::time_point dead
     Report result = {};
     bool told = false;
     try {
-        told = Follow(output.reading.Number(), report.reading.Number(), deadline + grace,
-                      outcome.output, result);
+        told = Follow(output.reading.Get(), report.reading.Get(), deadline + grace, outcome.output,
+                      result);
     } catch (...) {
         (void)::kill(static_cast<pid_t>(made), SIGKILL); // the program dies with it
         while (::waitpid(static_cast<pid_t>(made), nullptr, __WALL) < 0 && errno == EINTR) {
@@ -392,19 +360,21 @@ ChildProcess::Outcome ChildProcess::Run(Task const& task, Clock::time_point dead
     while (::waitpid(static_cast<pid_t>(made), nullptr, __WALL) < 0 && errno == EINTR) {
     }
     if (!told) {
-        throw Failure(SeeSystemLog, "the process that ran '" + program + "' ended without a word");
+        throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG,
+                      "the process that ran '" + program + "' ended without a word");
     }
     switch (result.news) {
     case News::NotStarted:
-        ThrowSystem("cannot start '" + path + "'", result.value);
+        ThrowSystemFailure("cannot start '" + path + "'", result.value);
     case News::TimedOut:
         outcome.timedOut = true;
+        outcome.signal = SIGKILL;
         outcome.code = 128 + SIGKILL;
         break;
     case News::Ended:
         outcome.timedOut = false;
-        outcome.code =
-            WIFEXITED(result.value) ? WEXITSTATUS(result.value) : 128 + WTERMSIG(result.value);
+        outcome.signal = WIFSIGNALED(result.value) ? WTERMSIG(result.value) : 0;
+        outcome.code = WIFEXITED(result.value) ? WEXITSTATUS(result.value) : 128 + outcome.signal;
         break;
     }
     return outcome;

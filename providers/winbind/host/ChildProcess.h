@@ -36,6 +36,8 @@ public:
     struct Outcome {
         /// The exit code; 128 and the signal's number where a signal ended the program.
         int code;
+        /// The number of that signal, or 0.
+        int signal;
         /// The deadline ended it; `code` then is 137.
         bool timedOut;
         /// Its output and its messages, as they came; of a long one the first mebibyte.
@@ -44,7 +46,7 @@ public:
 
     /// Blocks until the program has ended, `deadline` at the latest. What a daemon writes later is
     /// not waited for.
-    /// @throws Failure 1060 if there is no such program, `SeeSystemLog` where none can be started
+    /// @throws Failure 1060 if there is no such program, `TSLAUTH_WINBIND_SEE_SYSTEM_LOG` where none can be started
     static Outcome Run(Task const& task, Clock::time_point deadline);
 
     /// The program's path, or empty where it is not installed.

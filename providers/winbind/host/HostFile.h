@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include <tslauth/tslauth_provider.h>
+
 #include <functional>
 #include <optional>
 #include <string>
@@ -10,21 +12,23 @@
 /// The host's files: read whole, replaced whole, put back.
 namespace tessel::winbind {
 
-/// @throws Failure 5, 8 or `SeeSystemLog`, with what + ": " + the system's text for `error`
+/// What a refusal of the system's is to the caller: 5, 8, 112 or "see the system log".
+ActiveDirectoryClientErrorCode CodeOfSystem(int error) noexcept;
+
+/// @throws Failure of that code, with what + ": " + the system's text for `error`
 [[noreturn]] void ThrowSystemFailure(std::string const& what, int error);
 
 /// The bytes of a file, or nothing where there is none.
 /// @throws Failure where it cannot be read
 std::optional<std::string> ReadHostFile(std::string const& path);
 
+/// Whether anything is there, a link that leads nowhere included.
+/// @throws Failure where that cannot be told
 bool FileExists(std::string const& path);
 
 /// Where there is none, there is nothing to do.
 /// @throws Failure
 void RemoveHostFile(std::string const& path);
-
-/// Makes the entries of the folder that holds `path` durable, as far as its file system does that.
-void SyncFolderOf(std::string const& path) noexcept;
 
 /// Changes of the host that are taken back, in reverse order, unless they are kept. Taking back is
 /// done with what was set aside before, and needs no room on a disk.
@@ -39,8 +43,8 @@ public:
     /// Takes back what was not kept.
     ~HostChanges();
 
-    /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner and mode,
-    /// and a link to it stays a link.
+    /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner, mode, access
+    /// control list and other extended attributes, and a link to it stays a link.
     /// @param mode for a new file
     /// @throws Failure, and the file is as it was; also where the path is a link to nothing
     void Replace(std::string const& path, std::string const& text, mode_t mode);
@@ -48,10 +52,10 @@ public:
     /// Removes a file, if there is one.
     void Remove(std::string const& path);
 
-    /// Makes an empty file that is there until the changes are kept or taken back: who finds it later
-    /// knows that a process has died in between.
+    /// Makes a file that is there until the changes are kept or taken back: who finds it later knows
+    /// that a process has died in between, and reads in `text` what that one was about.
     /// @throws Failure
-    void Mark(std::string const& path);
+    void Mark(std::string const& path, std::string const& text);
 
     /// Makes a folder, if there is none.
     /// @return whether it was made
@@ -60,7 +64,8 @@ public:
     /// Whatever else is to be taken back in its turn.
     void OnUndo(std::function<void()> step);
 
-    /// The changes are the host's from now on.
+    /// The changes are the host's from now on, durably: a power loss brings no mark and no original
+    /// back.
     void Keep() noexcept;
 
     /// Takes all changes back. What fails is logged, and the rest goes on.
@@ -68,8 +73,11 @@ public:
     bool Undo() noexcept;
 
 private:
+    void SetAside(std::string const& target);
+
     std::vector<std::function<void()>> _undo;
-    std::vector<std::string> _originals;
+    /// Marks and originals, which go with the end of the changes.
+    std::vector<std::string> _passing;
 };
 
 /// Puts the originals of `paths` back that a `HostChanges` without an end has left.

@@ -3,13 +3,11 @@
 
 #include "Failure.h"
 #include "Paths.h"
+#include "host/Host.h"
 #include "host/HostFile.h"
 #include "text/DirectoryNames.h"
 #include "text/SambaInclude.h"
 
-#include <algorithm>
-#include <climits>
-#include <unistd.h>
 #include <utility>
 
 namespace tessel::winbind {
@@ -25,29 +23,14 @@ constexpr std::pair<Membership::Made, char const*> words[] = {
     {Membership::Made::Daemon, "winbindd"},
 };
 
-std::set<Membership::Made> ReadRecord(std::string const& text) {
-    std::set<Membership::Made> made;
-    std::string::size_type const start = text.find(recordStart);
-    if (start == std::string::npos) {
-        return made;
-    }
-    std::string const line = text.substr(start, text.find('\n', start) - start) + ' ';
-    for (auto const& [what, word] : words) {
-        if (line.find(std::string(" ") + word + ' ') != std::string::npos) {
-            made.insert(what);
-        }
-    }
-    return made;
-}
-
 } // namespace
 
 std::string Membership::DNSName() const {
     return DomainName(domain.realm);
 }
 
-std::optional<Membership> Membership::ReadOwnFile() {
-    auto const own = ReadHostFile(Paths::OwnSamba);
+std::optional<Membership> Membership::ReadOwnFile(Host const& host) {
+    auto const own = ReadHostFile(host.At(Paths::OwnSamba));
     if (!own) {
         return std::nullopt;
     }
@@ -58,9 +41,9 @@ std::optional<Membership> Membership::ReadOwnFile() {
     return Membership{std::move(*domain), ReadRecord(*own)};
 }
 
-std::optional<Membership> Membership::Read() {
-    auto membership = ReadOwnFile();
-    auto const samba = ReadHostFile(Paths::Samba);
+std::optional<Membership> Membership::Read(Host const& host) {
+    auto membership = ReadOwnFile(host);
+    auto const samba = ReadHostFile(host.At(Paths::Samba));
     if (!samba || !HasSambaInclude(*samba, Paths::OwnSamba)) {
         return std::nullopt;
     }
@@ -77,12 +60,19 @@ std::string Membership::Record(std::set<Made> const& made) {
     return line.empty() ? line : recordStart + line + '\n';
 }
 
-std::string HostComputerName() {
-    char name[HOST_NAME_MAX + 1] = {};
-    if (::gethostname(name, sizeof name - 1) != 0) {
-        throw Failure(TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME, "the host's name cannot be read");
+std::set<Membership::Made> Membership::ReadRecord(std::string const& text) {
+    std::set<Made> made;
+    std::string::size_type const start = text.find(recordStart);
+    if (start == std::string::npos) {
+        return made;
     }
-    return ComputerName(name);
+    std::string const line = text.substr(start, text.find('\n', start) - start) + ' ';
+    for (auto const& [what, word] : words) {
+        if (line.find(std::string(" ") + word + ' ') != std::string::npos) {
+            made.insert(what);
+        }
+    }
+    return made;
 }
 
 } // namespace tessel::winbind

@@ -9,6 +9,8 @@
 
 namespace tessel::winbind {
 
+class Host;
+
 /// The host's membership, as a join of this provider recorded it in its own file for Samba.
 struct Membership {
     /// What a join made that a part is to take away again.
@@ -28,18 +30,17 @@ struct Membership {
     /// Nothing where the host is joined to no domain by this provider: its own file is not there,
     /// or smb.conf, which decides, does not include it.
     /// @throws Failure where a file cannot be read
-    static std::optional<Membership> Read();
+    static std::optional<Membership> Read(Host const& host);
 
     /// The same where smb.conf does not count: also what a join has not reached, or a part left.
-    static std::optional<Membership> ReadOwnFile();
+    static std::optional<Membership> ReadOwnFile(Host const& host);
 
     /// What is put before the text of the own file, for `Read`. Not behind it: its last line may be
     /// one that nothing can follow.
     static std::string Record(std::set<Made> const& made);
-};
 
-/// The host's name for its machine account, from gethostname(2).
-/// @throws Failure 1210
-std::string HostComputerName();
+    /// What a text that begins with a `Record` says.
+    static std::set<Made> ReadRecord(std::string const& text);
+};
 
 } // namespace tessel::winbind

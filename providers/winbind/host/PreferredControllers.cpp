@@ -61,7 +61,7 @@ std::vector<std::string> PreferredControllers::Read() const {
         }
         return controllers;
     } catch (authentication::Exception const& e) {
-        throw Failure(SeeSystemLog, "'" + _path + "': " + e.what());
+        throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, "'" + _path + "': " + e.what());
     }
 }
 
@@ -85,7 +85,7 @@ void PreferredControllers::Write(std::vector<std::string> const& controllers) co
         file.insert({Paths::PreferredControllersKey, value}).first->second = value;
         file.Write();
     } catch (authentication::Exception const& e) {
-        throw Failure(SeeSystemLog, "'" + _path + "': " + e.what());
+        throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, "'" + _path + "': " + e.what());
     }
 }
 

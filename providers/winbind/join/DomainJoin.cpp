@@ -3,254 +3,270 @@
 
 #include "Failure.h"
 #include "Paths.h"
+#include "host/Host.h"
 #include "host/HostFile.h"
 #include "host/Membership.h"
 #include "host/OperationLock.h"
 #include "host/PreferredControllers.h"
+#include "host/StagingFolder.h"
 #include "host/SystemLog.h"
+#include "join/AccountUndo.h"
 #include "join/LocalMembership.h"
+#include "samba/Account.h"
 #include "samba/DomainDiscovery.h"
 #include "samba/SambaTools.h"
-#include "samba/StagingFolder.h"
 #include "text/DirectoryNames.h"
 #include "tslauth_winbind_provider.h"
-#include <base/AsciiText.h>
 
 #include <algorithm>
-#include <array>
-#include <ctime>
+#include <base/AsciiText.h>
+#include <exception>
 #include <optional>
-#include <strings.h>
+#include <string_view>
+#include <vector>
 
 namespace tessel::winbind::DomainJoin {
 
 namespace {
 
-using base::AsciiText::Upper;
-
 /// Of the time for a join, what is kept for undoing it: winbindd is stopped and started again, each
 /// of which may have to wait, and the account is deleted.
 constexpr auto undoTime = std::chrono::seconds(55);
-constexpr auto accountUndoTime = std::chrono::seconds(12);
-constexpr auto answerLimit = std::chrono::seconds(3);
 constexpr auto toolLimit = std::chrono::seconds(45);
-/// How much earlier than this join an account must have been made to be somebody else's work.
-constexpr auto clockTolerance = std::chrono::seconds(3);
+constexpr auto lookLimit = std::chrono::seconds(10);
 constexpr std::size_t longestBlob = std::size_t(1024) * 1024;
 constexpr std::size_t longestNetBIOSName = 15;
 
-Clock::time_point WorkDeadline() {
-    return Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_JOIN_SECONDS) - undoTime;
+/// What is asked for.
+struct Order {
+    std::string domain;
+    std::string computer;
+    Clock::time_point deadline;
+};
+
+/// A host that can be joined.
+struct FreeHost {
+    SambaFolders folders;
+    /// Of a join or a part that did not end: it stays until the new one is sure to succeed in the
+    /// directory, because it may be whole.
+    std::optional<Membership> half;
+};
+
+/// A controller that answers, with what it takes to undo there.
+struct Partner {
+    ControllerAnswer answer;
+    std::string begin; ///< its time, as a directory writes it, just before the join
+};
+
+/// What the controller's half of a join has made.
+struct Secrets {
+    std::string database;
+    /// Who can delete the account; null: it was not made by this join.
+    Account const* account;
+};
+
+Clock::time_point ToolDeadline(Order const& order) {
+    return std::min(order.deadline, Clock::now() + toolLimit);
 }
 
 /// What the tools need to know before a controller has told the rest.
-SambaDomain Guess(std::string const& domain, std::string const& computer) {
+SambaDomain Guess(Order const& order) {
+    using base::AsciiText::Upper;
+    std::string const& domain = order.domain;
     return {Upper(domain),
             Upper(domain.substr(0, domain.find('.')).substr(0, longestNetBIOSName)),
-            computer,
+            order.computer,
             {}};
 }
 
-/// A join could not be finished without it.
-void RequireWinbindd() {
-    if (ChildProcess::Find("winbindd").empty()) {
-        throw Failure(TSLAUTH_PROVIDER_SERVICE_DOES_NOT_EXIST,
-                      "the program 'winbindd' is not installed");
+/// A join could not be finished without them.
+void RequirePrograms(Host const& host) {
+    for (char const* const program : {"net", "testparm", "winbindd"}) {
+        if (!host.Has(program)) {
+            throw Failure(TSLAUTH_PROVIDER_SERVICE_DOES_NOT_EXIST,
+                          std::string("the program '") + program + "' is not installed");
+        }
     }
 }
 
-void RequireNotJoined(Clock::time_point deadline) {
-    if (auto const membership = Membership::Read()) {
-        throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED,
-                      "this host is joined to '" + membership->DNSName() + "'");
+void RequireNotJoined(Host const& host, SambaFolders const& folders, Clock::time_point deadline) {
+    if (auto const membership = Membership::Read(host)) {
+        if (!LocalMembership::IsHalf(host)) {
+            throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED,
+                          "this host is joined to '" + membership->DNSName() + "'");
+        }
+        return;
     }
-    SambaFolders const folders = SambaFolders::Read(deadline);
     if (folders.isDomainController) {
         throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED, "this host is a domain controller");
     }
     // An administrator may have written the settings of a member and never joined.
-    if (folders.isDomainMember && SambaTools().HasMachineSecret(deadline)) {
+    if (folders.isDomainMember && SambaTools(host).HasMachineSecret(deadline)) {
         throw Failure(TSLAUTH_PROVIDER_SETUP_ALREADY_JOINED,
                       std::string("this host is joined by other means; '") + Paths::Samba +
                           "' says to which domain");
     }
 }
 
-/// As a directory writes it, so that texts compare as times do.
-std::string GeneralizedTime(std::chrono::system_clock::time_point time) {
-    std::time_t const seconds = std::chrono::system_clock::to_time_t(time);
-    std::tm parts = {};
-    std::array<char, 32> text = {};
-    (void)::gmtime_r(&seconds, &parts); // fails for years that no clock shows
-    (void)std::strftime(text.data(), text.size(), "%Y%m%d%H%M%S", &parts);
-    return text.data();
+/// Phase 1: the host alone. Puts in order what an earlier operation has left, short of a membership.
+FreeHost LookAtHost(Host const& host, Order const& order) {
+    RequirePrograms(host);
+    SambaFolders folders = ReadSambaFolders(host, order.deadline);
+    if (LocalMembership::CleanUp(host, folders, order.deadline)) {
+        folders = ReadSambaFolders(host, order.deadline);
+    }
+    RequireNotJoined(host, folders, order.deadline);
+    LocalMembership::RequireRoom(host, folders);
+    return {folders, Membership::Read(host)};
 }
 
-/// Whether `net` may fail with this after the controller has made the account. What it says of
-/// names, rights and passwords comes before.
+/// Phase 2: a controller, whose name and clock fit this host, and the tools' configuration for it.
+/// @param first asked before the preferred controllers; may be empty
+Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
+                    std::string const& first, StagingFolder& staging) {
+    std::vector<std::string> preferred = PreferredControllers(host.At(Paths::State)).Read();
+    if (!first.empty()) {
+        preferred.insert(preferred.begin(), first);
+    }
+    staging.Configure(Guess(order), order.domain, {});
+    SambaTools const tools(host, staging);
+    auto const answer =
+        DomainDiscovery::FindController(host, tools, order.domain, preferred, order.deadline);
+    DomainDiscovery::CheckHostName(host, order.computer, answer, order.domain);
+    auto const ahead = DomainDiscovery::CheckClock(tools, answer.controller, order.deadline);
+    staging.Configure({answer.Realm(), answer.netBIOSDomain, order.computer, {}}, order.domain,
+                      {answer.controller});
+    std::string const secrets = LocalMembership::SecretsBeforeJoin(host, free.folders);
+    if (!secrets.empty()) {
+        staging.SetSecrets(secrets);
+    }
+    return {answer, AccountUndo::Begin(ahead)};
+}
+
+std::string SecretsIn(StagingFolder const& staging) {
+    std::string secrets = staging.Secrets();
+    if (secrets.empty()) {
+        throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, "the join has made no secrets");
+    }
+    return secrets;
+}
+
+/// Whether a failure may have come after the controller had made the account. What it says of names,
+/// rights and passwords comes before.
 bool MayComeFromTheMiddle(ActiveDirectoryClientErrorCode code) {
-    return code == SeeSystemLog || code == TSLAUTH_PROVIDER_TIMED_OUT ||
+    return code == TSLAUTH_WINBIND_SEE_SYSTEM_LOG || code == TSLAUTH_PROVIDER_TIMED_OUT ||
            code == TSLAUTH_PROVIDER_NO_LOGON_SERVERS || code == TSLAUTH_PROVIDER_NO_NETWORK ||
            code == TSLAUTH_PROVIDER_CONNECTION_INVALID ||
-           code == TSLAUTH_PROVIDER_CONNECTION_REFUSED;
+           code == TSLAUTH_PROVIDER_CONNECTION_REFUSED || code == TSLAUTH_WINBIND_DISK_FULL ||
+           code == TSLAUTH_PROVIDER_INTERNAL_ERROR || code == TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY;
 }
 
-/// A membership in the making, with what its undoing needs.
-class Join {
-public:
-    Join(std::string domain, std::string computer)
-        : _deadline(WorkDeadline()), _domain(std::move(domain)), _computer(std::move(computer)),
-          _lock(_deadline) {
-        RequireWinbindd();
-        LocalMembership::CleanUp(_deadline);
-        LocalMembership::FinishOpenChange(_deadline);
-        RequireNotJoined(_deadline);
-        _staging.emplace();
-        _staging->Configure(Guess(_domain, _computer), _domain, {});
-        _tools = SambaTools(*_staging);
-    }
-
-    /// @param first asked before the preferred controllers; may be empty
-    void FindController(std::string const& first) {
-        std::vector<std::string> preferred = PreferredControllers(Paths::State).Read();
-        if (!first.empty()) {
-            preferred.insert(preferred.begin(), first);
-        }
-        _controller = DomainDiscovery::FindController(_tools, _domain, preferred, _deadline);
-        DomainDiscovery::CheckHostName(_computer, _controller, _domain);
-        auto const ahead = DomainDiscovery::CheckClock(_tools, _controller.controller, _deadline);
-        _begin = GeneralizedTime(std::chrono::system_clock::now() + ahead - clockTolerance);
-        _staging->Configure({_controller.Realm(), _controller.netBIOSDomain, _computer, {}},
-                            _domain, {_controller.controller});
-        // So that what others keep there comes along.
-        SambaFolders const folders = SambaFolders::Read(_deadline);
-        if (auto const secrets = ReadHostFile(folders.secrets + '/' + Paths::Secrets)) {
-            _staging->SetSecrets(*secrets);
-        }
-    }
-
-    void MakeSecrets(Account const& account, std::string const& unit) {
-        try {
-            _tools.Join(_controller.controller, account, unit, ToolDeadline());
-        } catch (Failure const& e) {
-            if (MayComeFromTheMiddle(e.Code())) {
-                ThrowInterrupted(e, account);
-            }
+/// Phase 3: the directory. The host is untouched as yet.
+Secrets MakeSecrets(Host const& host, Order const& order, Partner const& partner,
+                    Account const& account, std::string const& unit, StagingFolder const& staging) {
+    SambaTools const tools(host, staging);
+    bool isMade = false;
+    try {
+        tools.Join(partner.answer.controller, account, unit, ToolDeadline(order));
+        isMade = true;
+        return {SecretsIn(staging), &account};
+    } catch (Failure const& e) {
+        if (!isMade && !MayComeFromTheMiddle(e.Code())) {
             throw;
         }
-    }
-
-    void MakeSecrets(SecretFile const& blob) {
-        _tools.JoinOffline(blob, ToolDeadline());
-    }
-
-    /// @param controllers for the host's configuration
-    /// @param account who can undo the join; null: the account was not made by it
-    void Finish(std::vector<std::string> const& controllers, Account const* account) {
-        HostChanges changes;
-        try {
-            std::string const secrets = _staging->Secrets();
-            if (secrets.empty()) {
-                throw Failure(SeeSystemLog, "the join has made no secrets");
-            }
-            LocalMembership::Establish(
-                {{_controller.Realm(), _controller.netBIOSDomain, _computer, controllers}, _domain},
-                secrets, changes, _deadline);
-        } catch (Failure const& e) {
-            bool const isWhole = changes.Undo();
-            std::string text =
-                "'" + _controller.controller +
-                "' accepted the join, and it could not be finished here: " + e.what();
-            std::string left;
-            if (account) {
-                left = LeftInDirectory(*account);
-                text += left.empty() ? "; the account was deleted again" : "; " + left;
-            } else {
-                // Whoever made the account knows of it, and this join has changed nothing of it.
-                text += "; the account that was made for it stays in the directory";
-            }
-            if (!isWhole) {
-                text += "; the host is not as it was";
-            }
-            throw Failure(isWhole && left.empty() ? e.Code() : HalfDone, text);
-        }
-        changes.Keep();
-    }
-
-    /// An account that exists already stays where it is; whoever asked for a unit should know.
-    void TellOfUnit(std::string const& unit, Account const& account) {
-        try {
-            std::string const name = _tools.ComputerAttribute(
-                _controller.controller, _computer, "distinguishedName", account, ToolDeadline());
-            std::string const parent = name.substr(std::min(name.size(), name.find(',') + 1));
-            if (::strcasecmp(parent.c_str(), unit.c_str()) != 0) {
-                LogWarning("the account existed already, and stays at '" + name + "'");
-            }
-        } catch (Failure const& e) {
-            LogWarning(std::string("where the account is could not be found out: ") + e.what());
-        }
-    }
-
-private:
-    bool Answers() const {
-        try {
-            (void)_tools.Lookup(_controller.controller, Clock::now() + answerLimit);
-            return true;
-        } catch (Failure const&) {
-            return false;
-        }
-    }
-
-    Clock::time_point ToolDeadline() const {
-        return std::min(_deadline, Clock::now() + toolLimit);
-    }
-
-    /// The controller fell silent, or `net` failed for a reason without a name: it may have made the
-    /// account by then.
-    [[noreturn]] void ThrowInterrupted(Failure const& failure, Account const& account) {
-        if (!Answers()) {
+        AccountUndo const undo = {tools, partner.answer.controller, order.computer, partner.begin};
+        if (!undo.Answers()) {
             throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
-                          "'" + _controller.controller +
-                              "' has fallen silent, and may have made the account '" + _computer +
-                              "$': " + failure.what());
+                          "'" + partner.answer.controller +
+                              "' has fallen silent, and may have made the account '" +
+                              order.computer + "$': " + e.what());
         }
-        std::string const left = LeftInDirectory(account);
+        std::string const left = undo.Run(account);
         if (!left.empty()) {
-            throw Failure(HalfDone, left + ": " + failure.what());
+            throw Failure(TSLAUTH_WINBIND_ACCOUNT_LEFT, left + ": " + e.what());
         }
-        throw Failure(failure);
+        throw;
     }
+}
 
-    /// Deletes the account that this join has made.
-    /// @return what stays there, or empty
-    std::string LeftInDirectory(Account const& account) {
-        std::string const name = "the account '" + _computer + "$'";
-        auto const deadline = Clock::now() + accountUndoTime;
-        try {
-            std::string const made = _tools.ComputerAttribute(_controller.controller, _computer,
-                                                              "whenCreated", account, deadline);
-            if (made.empty()) {
-                return {}; // there is none
-            }
-            if (made < _begin) {
-                return name + " was there before, and stays, with another password";
-            }
-            _tools.Leave(_controller.controller, &account, deadline);
-            return {};
-        } catch (Failure const& e) {
-            return name + " could not be deleted: " + e.what();
+Secrets MakeSecrets(Host const& host, Order const& order, SecretFile const& blob,
+                    StagingFolder const& staging) {
+    SambaTools(host, staging).JoinOffline(blob, ToolDeadline(order));
+    return {SecretsIn(staging), nullptr};
+}
+
+/// What has become of the half of a membership that was in the way.
+void GiveUp(Host const& host, FreeHost const& free) {
+    if (free.half) {
+        LogWarning(
+            "parting from a domain that a join or a part which did not end has left in half; "
+            "an account that is there stays in the directory");
+        LocalMembership::Dissolve(host, free.folders, *free.half);
+    }
+}
+
+/// Takes everything back that a join has done, and tells what cannot be.
+[[noreturn]] void ThrowUndone(Order const& order, Partner const& partner, Secrets const& secrets,
+                              SambaTools const& tools, HostChanges& changes, bool isHostChanged,
+                              ActiveDirectoryClientErrorCode code, std::string const& why) {
+    isHostChanged = !changes.Undo() || isHostChanged;
+    std::string text = "'" + partner.answer.controller +
+                       "' accepted the join, and it could not be finished here: " + why;
+    std::string left;
+    if (secrets.account) {
+        left = AccountUndo{tools, partner.answer.controller, order.computer, partner.begin}.Run(
+            *secrets.account);
+        text += left.empty() ? "; the account was deleted again" : "; " + left;
+    } else {
+        // Whoever made the account knows of it, and this join has changed nothing of it.
+        text += "; the account that was made for it stays in the directory";
+    }
+    if (isHostChanged) {
+        throw Failure(TSLAUTH_WINBIND_HOST_CHANGED, text + "; the host is not as it was");
+    }
+    throw Failure(left.empty() ? code : TSLAUTH_WINBIND_ACCOUNT_LEFT, text);
+}
+
+/// Phase 4: the host.
+/// @param controllers for its configuration
+void TakeOver(Host const& host, Order const& order, FreeHost const& free, Partner const& partner,
+              Secrets const& secrets, std::vector<std::string> const& controllers,
+              SambaTools const& tools) {
+    HostChanges changes;
+    bool isDissolved = false;
+    try {
+        GiveUp(host, free);
+        isDissolved = free.half.has_value();
+        LocalMembership::Establish(
+            host, free.folders,
+            {{partner.answer.Realm(), partner.answer.netBIOSDomain, order.computer, controllers},
+             order.domain},
+            secrets.database, changes, order.deadline);
+    } catch (Failure const& e) {
+        ThrowUndone(order, partner, secrets, tools, changes,
+                    isDissolved || e.Code() == TSLAUTH_WINBIND_HOST_CHANGED, e.Code(), e.what());
+    } catch (std::exception const& e) {
+        ThrowUndone(order, partner, secrets, tools, changes, isDissolved,
+                    TSLAUTH_PROVIDER_INTERNAL_ERROR, e.what());
+    }
+    changes.Keep();
+}
+
+/// An account that exists already stays where it is; whoever asked for a unit should know.
+void TellOfUnit(Order const& order, Partner const& partner, std::string const& unit,
+                Account const& account, SambaTools const& tools) {
+    try {
+        std::string const name =
+            tools.ComputerAttribute(partner.answer.controller, order.computer, "distinguishedName",
+                                    account, ToolDeadline(order));
+        std::string const parent = name.substr(std::min(name.size(), name.find(',') + 1));
+        if (!base::AsciiText::EqualsIgnoringCase(parent, unit)) {
+            LogWarning("the account existed already, and stays at '" + name + "'");
         }
+    } catch (Failure const& e) {
+        LogWarning(std::string("where the account is could not be found out: ") + e.what());
     }
-
-    Clock::time_point const _deadline;
-    std::string const _domain;
-    std::string const _computer;
-    OperationLock const _lock;
-    std::optional<StagingFolder> _staging; ///< made after those of before are removed
-    SambaTools _tools;
-    ControllerAnswer _controller;
-    std::string _begin;
-};
+}
 
 void CheckBlob(std::string_view blob) {
     static constexpr std::string_view allowed = "ABCDEFGHIJKLMNOPQRSTUVWXYZ"
@@ -263,32 +279,40 @@ void CheckBlob(std::string_view blob) {
     }
 }
 
+Order OrderOf(Host const& host, std::string const& domain) {
+    return {DomainName(domain), ComputerName(host.Name()),
+            Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_JOIN_SECONDS) - undoTime};
+}
+
 } // namespace
 
-void WithCredentials(std::string const& domain, std::string const& unit,
+void WithCredentials(Host const& host, std::string const& domain, std::string const& unit,
                      ActiveDirectoryClientCredentials const& credentials) {
-    std::string const name = DomainName(domain);
+    Order const order = OrderOf(host, domain);
     std::string const place =
-        unit.empty() ? unit : ReadOrganisationalUnit(unit, name).distinguishedName;
-    std::string const computer = HostComputerName();
+        unit.empty() ? unit : ReadOrganisationalUnit(unit, order.domain).distinguishedName;
     Account const account(credentials);
-    Join join(name, computer);
-    join.FindController("");
-    join.MakeSecrets(account, place);
-    join.Finish(PreferredControllers(Paths::State).Read(), &account);
+
+    OperationLock const lock(host.At(Paths::Lock), order.deadline);
+    FreeHost const free = LookAtHost(host, order);
+    StagingFolder staging(host.At(Paths::Staging));
+    Partner const partner = FindPartner(host, order, free, "", staging);
+    Secrets const secrets = MakeSecrets(host, order, partner, account, place, staging);
+    SambaTools const tools(host, staging);
+    TakeOver(host, order, free, partner, secrets,
+             PreferredControllers(host.At(Paths::State)).Read(), tools);
     if (!place.empty()) {
-        join.TellOfUnit(place, account);
+        TellOfUnit(order, partner, place, account, tools);
     }
 }
 
-void WithMachineAccount(ActiveDirectoryClientDomainInformation const& information,
+void WithMachineAccount(Host const& host, ActiveDirectoryClientDomainInformation const& information,
                         ActiveDirectoryClientMachineAccount const& account) {
-    std::string const name = DomainName(information.dnsDomainName);
-    std::string const computer = HostComputerName();
-    if (ComputerName(account.accountName) != computer) {
+    Order const order = OrderOf(host, information.dnsDomainName);
+    if (ComputerName(account.accountName) != order.computer) {
         throw Failure(TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME,
                       "the machine account is for '" + std::string(account.accountName) +
-                          "', and this host is '" + computer + "'");
+                          "', and this host is '" + order.computer + "'");
     }
     CheckBlob(account.firstResult);
     std::string const controller = account.secondResult;
@@ -297,15 +321,28 @@ void WithMachineAccount(ActiveDirectoryClientDomainInformation const& informatio
                       "the machine account's second result is no controller's name");
     }
     SecretFile const blob({account.firstResult});
-    Join join(name, computer);
-    join.FindController(controller);
-    join.MakeSecrets(blob);
-    std::vector<std::string> controllers = PreferredControllers(Paths::State).Read();
+
+    OperationLock const lock(host.At(Paths::Lock), order.deadline);
+    FreeHost const free = LookAtHost(host, order);
+    StagingFolder staging(host.At(Paths::Staging));
+    Partner const partner = FindPartner(host, order, free, controller, staging);
+    Secrets const secrets = MakeSecrets(host, order, blob, staging);
+    std::vector<std::string> controllers = PreferredControllers(host.At(Paths::State)).Read();
     if (controllers.empty() && !controller.empty()) {
         // The others may not have heard of the account yet.
         controllers.push_back(controller);
     }
-    join.Finish(controllers, nullptr);
+    TakeOver(host, order, free, partner, secrets, controllers, SambaTools(host, staging));
+}
+
+void RequireJoinable(Host const& host) {
+    auto const deadline = Clock::now() + lookLimit;
+    (void)ComputerName(host.Name());
+    RequirePrograms(host);
+    SambaFolders const folders = ReadSambaFolders(host, deadline);
+    RequireNotJoined(host, folders, deadline);
+    LocalMembership::RequireRoom(host, folders);
+    StagingFolder const staging(host.At(Paths::Staging));
 }
 
 } // namespace tessel::winbind::DomainJoin

@@ -4,16 +4,20 @@
 #include "Failure.h"
 #include "Paths.h"
 #include "host/FolderSnapshot.h"
+#include "host/Host.h"
+#include "host/StagingFolder.h"
 #include "host/SystemLog.h"
-#include "samba/StagingFolder.h"
-#include "samba/WinbindDaemon.h"
+#include "samba/SambaTools.h"
 #include "text/KerberosConfiguration.h"
 #include "text/SambaInclude.h"
 
 #include <algorithm>
+#include <base/WholeFile.h>
 #include <cerrno>
 #include <functional>
+#include <memory>
 #include <unistd.h>
+#include <utility>
 #include <vector>
 
 namespace tessel::winbind::LocalMembership {
@@ -24,11 +28,14 @@ constexpr auto daemonLimit = std::chrono::seconds(20);
 constexpr auto trustLimit = std::chrono::seconds(30); // of a controller that others join as well
 constexpr auto stopLimit = std::chrono::seconds(10);
 
+/// What winbindd's databases take when it starts, and as much again: without room for them it
+/// starts, and answers nothing but "internal error".
+constexpr unsigned long long leastRoom = 8ULL * 1024 * 1024;
+
 using Made = Membership::Made;
 
-std::string FolderOf(char const* path) {
-    std::string const text = path;
-    return text.substr(0, text.rfind('/'));
+std::string FolderOf(std::string const& path) {
+    return path.substr(0, path.rfind('/'));
 }
 
 std::string SecretsOf(SambaFolders const& folders) {
@@ -39,8 +46,15 @@ std::string BeforeJoinOf(SambaFolders const& folders) {
     return folders.secrets + '/' + Paths::SecretsBeforeJoin;
 }
 
-std::vector<std::string> ChangedFiles(SambaFolders const& folders) {
-    return {Paths::Samba, Paths::OwnSamba, Paths::Kerberos, Paths::OwnKerberos, SecretsOf(folders)};
+std::vector<std::string> ChangedFiles(Host const& host, SambaFolders const& folders) {
+    return {host.At(Paths::Samba), host.At(Paths::OwnSamba), host.At(Paths::Kerberos),
+            host.At(Paths::OwnKerberos), SecretsOf(folders)};
+}
+
+void ReplaceAndKeep(std::string const& path, std::string const& text) {
+    HostChanges changes;
+    changes.Replace(path, text, 0644);
+    changes.Keep();
 }
 
 /// Settings of the administrator's that the own file must respect.
@@ -87,7 +101,7 @@ void RestoreSecrets(SambaFolders const& folders) {
     } else {
         RemoveHostFile(before); // a second name of the same file stays where it is
     }
-    SyncFolderOf(path);
+    base::SyncFolderOf(path);
 }
 
 /// What winbindd and `net` know of the domain, and can find out again.
@@ -117,184 +131,225 @@ bool RunAll(std::vector<std::function<void()>> const& steps) {
 }
 
 /// Takes the include out of krb5.conf, before the file that it names goes.
-void RemoveKerberos(bool fileIsMade, bool folderIsMade) {
-    auto const text = ReadHostFile(Paths::Kerberos);
+void RemoveKerberos(Host const& host, std::set<Made> const& made) {
+    std::string const path = host.At(Paths::Kerberos);
+    auto const text = ReadHostFile(path);
     if (text && HasKerberosInclude(*text, Paths::OwnKerberos)) {
         std::string const without = WithoutKerberosInclude(*text, Paths::OwnKerberos);
-        if (without.empty() && fileIsMade) {
-            RemoveHostFile(Paths::Kerberos);
+        if (without.empty() && made.count(Made::KerberosFile) != 0) {
+            RemoveHostFile(path);
         } else {
-            HostChanges changes;
-            changes.Replace(Paths::Kerberos, without, 0644);
-            changes.Keep();
+            ReplaceAndKeep(path, without);
         }
     }
-    RemoveHostFile(Paths::OwnKerberos);
-    if (folderIsMade) {
-        (void)::rmdir(Paths::OwnKerberosFolder); // stays where others use it
+    RemoveHostFile(host.At(Paths::OwnKerberos));
+    if (made.count(Made::KerberosFolder) != 0) {
+        (void)::rmdir(host.At(Paths::OwnKerberosFolder).c_str()); // stays where others use it
+    }
+}
+
+/// Takes the include out of smb.conf, with which the host is parted.
+void TakeOutOfSamba(Host const& host, std::string const& text, std::set<Made> const& made,
+                    HostChanges& changes) {
+    std::string const without = WithoutSambaInclude(text, Paths::OwnSamba);
+    if (without.empty() && made.count(Made::SambaFile) != 0) {
+        changes.Remove(host.At(Paths::Samba));
+    } else {
+        changes.Replace(host.At(Paths::Samba), without, 0644);
     }
 }
 
 /// Stops winbindd and takes everything away that comes after smb.conf. The own file for Samba goes
 /// last: it says what is left to do.
-bool RemoveRest(SambaFolders const& folders, Membership const& membership) {
+bool RemoveRest(Host const& host, SambaFolders const& folders, Membership const& membership) {
     std::set<Made> const& made = membership.made;
-    WinbindDaemon const daemon(folders);
-    bool const runs = daemon.Runs();
+    auto const daemon = host.Winbindd(folders);
+    bool const runs = daemon->Runs();
     bool const isWhole = RunAll({
-        [&] { daemon.Stop(Clock::now() + stopLimit); },
+        [&] { daemon->Stop(Clock::now() + stopLimit); },
         [&] {
             if (FileExists(BeforeJoinOf(folders))) {
                 RestoreSecrets(folders);
             }
         },
-        [&] {
-            RemoveKerberos(made.count(Made::KerberosFile) != 0,
-                           made.count(Made::KerberosFolder) != 0);
-        },
+        [&] { RemoveKerberos(host, made); },
         [&] { RemoveCaches(folders, membership.domain.workgroup); },
     });
     if (runs && made.count(Made::Daemon) == 0) {
         // It ran before the join. Whether it can serve a host without a domain is its own matter.
-        (void)RunAll({[&] { daemon.Restart(Clock::now() + stopLimit); }});
+        (void)RunAll({[&] { daemon->Restart(Clock::now() + stopLimit); }});
     }
-    return isWhole && RunAll({[] { RemoveHostFile(Paths::OwnSamba); },
-                              [] { RemoveHostFile(Paths::OpenChange); }});
+    return isWhole && RunAll({[&] {
+               for (std::string const& path :
+                    {host.At(Paths::OwnSamba), host.At(Paths::OpenChange)}) {
+                   RemoveHostFile(path);
+                   base::SyncFolderOf(path);
+               }
+           }});
+}
+
+/// What a join had made, or a part was to take away, that has left a mark; as far as it was told.
+std::set<Made> MadeByOpenChange(Host const& host) {
+    return Membership::ReadRecord(ReadHostFile(host.At(Paths::OpenChange)).value_or(""));
 }
 
 /// What an operation that was killed has left of a membership that smb.conf does not name.
-void FinishParting(SambaFolders const& folders, Clock::time_point deadline) {
-    auto const samba = ReadHostFile(Paths::Samba);
+void FinishParting(Host const& host, SambaFolders const& folders, Clock::time_point deadline) {
+    auto const samba = ReadHostFile(host.At(Paths::Samba));
     bool const isNamed = samba && HasSambaInclude(*samba, Paths::OwnSamba);
-    auto const left = Membership::ReadOwnFile();
-    if (!isNamed && !left && !FileExists(Paths::OwnSamba) && !FileExists(Paths::OwnKerberos) &&
-        !FileExists(BeforeJoinOf(folders))) {
+    auto left = Membership::ReadOwnFile(host);
+    bool const isMarked = FileExists(host.At(Paths::OpenChange));
+    if (!isNamed && !left && !isMarked && !FileExists(host.At(Paths::OwnSamba)) &&
+        !FileExists(host.At(Paths::OwnKerberos)) && !FileExists(BeforeJoinOf(folders))) {
         return;
     }
-    if (!isNamed && !FileExists(Paths::OpenChange) && folders.isDomainMember &&
-        SambaTools().HasMachineSecret(deadline)) {
+    if (!isNamed && !isMarked && folders.isDomainMember &&
+        SambaTools(host).HasMachineSecret(deadline)) {
         LogWarning(std::string("'") + Paths::Samba +
                    "' was replaced, and the host joined, by other means");
         return; // the secrets are not the provider's any more
     }
     LogWarning("cleaning up after a join or a part that did not end");
+    if (!left) {
+        left = Membership{{}, MadeByOpenChange(host)};
+    }
     if (isNamed) {
         HostChanges changes;
-        changes.Replace(Paths::Samba, WithoutSambaInclude(*samba, Paths::OwnSamba), 0644);
+        TakeOutOfSamba(host, *samba, left->made, changes);
         changes.Keep();
     }
-    // A join that was killed early has left no record of what it made.
-    Membership const guess = {{}, {Made::KerberosFile, Made::KerberosFolder}};
-    if (!RemoveRest(folders, left ? *left : guess)) {
-        throw Failure(SeeSystemLog, "what a join or a part has left cannot be removed");
+    if (!RemoveRest(host, folders, *left)) {
+        throw Failure(TSLAUTH_WINBIND_HOST_CHANGED,
+                      "what a join or a part has left cannot be removed");
     }
+}
+
+/// What a join is about to make, for the record.
+std::set<Made> MissingOf(Host const& host, Daemon const& daemon) {
+    std::set<Made> made;
+    for (auto const& [path, what] : {std::pair(Paths::Samba, Made::SambaFile),
+                                     {Paths::Kerberos, Made::KerberosFile},
+                                     {Paths::OwnKerberosFolder, Made::KerberosFolder}}) {
+        if (!FileExists(host.At(path))) {
+            made.insert(what);
+        }
+    }
+    if (!daemon.Runs()) {
+        made.insert(Made::Daemon);
+    }
+    return made;
+}
+
+/// The configuration of a member, smb.conf last: with it the host is joined.
+void WriteConfiguration(Host const& host, Domain const& domain, std::set<Made> const& made,
+                        HostChanges& changes) {
+    (void)changes.MakeFolder(host.At(Paths::OwnKerberosFolder), 0755);
+    changes.Replace(host.At(Paths::OwnKerberos),
+                    KerberosDomainText({domain.samba.realm, domain.dnsName}), 0644);
+    std::string const kerberos = host.At(Paths::Kerberos);
+    changes.Replace(kerberos,
+                    WithKerberosInclude(ReadHostFile(kerberos).value_or(""), Paths::OwnKerberos),
+                    0644);
+    std::string const samba = host.At(Paths::Samba);
+    std::string const text = ReadHostFile(samba).value_or("");
+    changes.Replace(host.At(Paths::OwnSamba),
+                    Membership::Record(made) +
+                        SambaDomainText(domain.samba, AdministratorSettings(text)),
+                    0644);
+    changes.Replace(samba, WithSambaInclude(text, Paths::OwnSamba), 0644);
+}
+
+/// Starts winbindd in its new domain.
+void StartDaemon(std::shared_ptr<Daemon const> const& daemon, SambaFolders const& folders,
+                 std::string const& logs, HostChanges& changes, Clock::time_point deadline) {
+    (void)changes.MakeFolder(folders.pid, 0755); // lies in /run, and may not be there yet
+    // Not before: what is new of the provider's own is taken back by its own steps.
+    FolderSnapshot const snapshot(
+        {folders.state, folders.secrets, folders.cache, folders.lock, folders.pid, logs});
+    changes.OnUndo([daemon, snapshot] {
+        daemon->Stop(Clock::now() + stopLimit);
+        if (daemon->IsAlone()) { // what is new may be another server's otherwise
+            snapshot.RemoveNewFiles();
+        }
+    });
+    daemon->Restart(std::min(deadline, Clock::now() + daemonLimit));
+    daemon->CheckTrust(std::min(deadline, Clock::now() + trustLimit));
 }
 
 } // namespace
 
-void Establish(Domain const& domain, std::string const& secrets, HostChanges& changes,
-               Clock::time_point deadline) {
-    SambaFolders const folders = SambaFolders::Read(deadline);
-    WinbindDaemon const daemon(folders);
-    bool const daemonRan = daemon.Runs();
-    std::set<Made> made;
-    if (daemonRan) {
-        // In the end, with the files of before.
-        changes.OnUndo([daemon] { daemon.Restart(Clock::now() + daemonLimit); });
-    } else {
-        made.insert(Made::Daemon);
-    }
-    (void)changes.MakeFolder(FolderOf(Paths::Samba), 0755);
-    changes.Mark(Paths::OpenChange);
-    ReplaceSecrets(folders, secrets, changes);
-
-    if (changes.MakeFolder(Paths::OwnKerberosFolder, 0755)) {
-        made.insert(Made::KerberosFolder);
-    }
-    changes.Replace(Paths::OwnKerberos, KerberosDomainText({domain.samba.realm, domain.dnsName}),
-                    0644);
-    auto const kerberos = ReadHostFile(Paths::Kerberos);
-    if (!kerberos) {
-        made.insert(Made::KerberosFile);
-    }
-    changes.Replace(Paths::Kerberos, WithKerberosInclude(kerberos.value_or(""), Paths::OwnKerberos),
-                    0644);
-    auto const samba = ReadHostFile(Paths::Samba);
-    if (!samba) {
-        made.insert(Made::SambaFile);
-    }
-    changes.Replace(Paths::OwnSamba,
-                    Membership::Record(made) +
-                        SambaDomainText(domain.samba, AdministratorSettings(samba.value_or(""))),
-                    0644);
-    changes.Replace(Paths::Samba, WithSambaInclude(samba.value_or(""), Paths::OwnSamba), 0644);
-
-    (void)changes.MakeFolder(folders.pid, 0755); // lies in /run, and may not be there yet
-    // Not before: what is new of the provider's own is taken back by its own steps.
-    FolderSnapshot const snapshot({folders.state, folders.secrets, folders.cache, folders.lock,
-                                   folders.pid, Paths::SambaLogs});
-    changes.OnUndo([daemon, snapshot] {
-        daemon.Stop(Clock::now() + stopLimit);
-        if (daemon.IsAlone()) { // what is new may be another server's otherwise
-            snapshot.RemoveNewFiles();
+void RequireRoom(Host const& host, SambaFolders const& folders) {
+    for (std::string const& folder :
+         {folders.secrets, folders.state, folders.cache, folders.lock,
+          FolderOf(host.At(Paths::Samba)), FolderOf(host.At(Paths::Kerberos))}) {
+        auto const free = host.FreeBytes(folder);
+        if (free < leastRoom) {
+            throw Failure(TSLAUTH_WINBIND_DISK_FULL,
+                          "the file system of '" + folder + "' has only " +
+                              std::to_string(free / 1024) + " KiB left, and winbindd needs " +
+                              std::to_string(leastRoom / 1024));
         }
-    });
-    daemon.Restart(std::min(deadline, Clock::now() + daemonLimit));
-    WinbindDaemon::CheckTrust(std::min(deadline, Clock::now() + trustLimit));
+    }
 }
 
-void Dissolve(Membership const& membership, Clock::time_point deadline) {
-    SambaFolders const folders = SambaFolders::Read(deadline);
-    {
-        HostChanges mark;
-        mark.Replace(Paths::OpenChange, "", 0600);
-        mark.Keep(); // it stays until all is done
+void Establish(Host const& host, SambaFolders const& folders, Domain const& domain,
+               std::string const& secrets, HostChanges& changes, Clock::time_point deadline) {
+    auto const daemon = host.Winbindd(folders);
+    std::set<Made> const made = MissingOf(host, *daemon);
+    if (made.count(Made::Daemon) == 0) {
+        // In the end, with the files of before.
+        changes.OnUndo([daemon] { daemon->Restart(Clock::now() + daemonLimit); });
     }
+    (void)changes.MakeFolder(FolderOf(host.At(Paths::Samba)), 0755);
+    changes.Mark(host.At(Paths::OpenChange), Membership::Record(made));
+    ReplaceSecrets(folders, secrets, changes);
+    WriteConfiguration(host, domain, made, changes);
+    StartDaemon(daemon, folders, host.At(Paths::SambaLogs), changes, deadline);
+}
+
+void Dissolve(Host const& host, SambaFolders const& folders, Membership const& membership) {
+    std::string const samba = host.At(Paths::Samba);
     {
         HostChanges changes;
+        changes.Replace(host.At(Paths::OpenChange), Membership::Record(membership.made), 0600);
         if (!FileExists(BeforeJoinOf(folders))) {
             // Somebody has taken it away. The secret must not stay for want of it.
             changes.Replace(BeforeJoinOf(folders), "", 0600);
         }
-        std::string const without =
-            WithoutSambaInclude(ReadHostFile(Paths::Samba).value_or(""), Paths::OwnSamba);
-        if (without.empty() && membership.made.count(Made::SambaFile) != 0) {
-            changes.Remove(Paths::Samba);
-        } else {
-            changes.Replace(Paths::Samba, without, 0644);
-        }
-        changes.Keep();
+        TakeOutOfSamba(host, ReadHostFile(samba).value_or(""), membership.made, changes);
+        changes.Keep(); // the mark among them: it stays until all is done
     }
-    if (!RemoveRest(folders, membership)) {
-        throw Failure(SeeSystemLog, "the host is parted, and keeps what the log names");
+    if (!RemoveRest(host, folders, membership)) {
+        throw Failure(TSLAUTH_WINBIND_HOST_CHANGED,
+                      "the host is parted, and keeps what the log names");
     }
 }
 
-void CleanUp(Clock::time_point deadline) {
-    StagingFolder::RemoveLeftOvers();
-    SambaFolders const folders = SambaFolders::Read(deadline);
-    std::vector<std::string> const files = ChangedFiles(folders);
-    if (!Membership::Read()) {
+bool CleanUp(Host const& host, SambaFolders const& folders, Clock::time_point deadline) {
+    StagingFolder::RemoveLeftOvers(host.At(Paths::Staging));
+    std::vector<std::string> const files = ChangedFiles(host, folders);
+    std::string const before = ReadHostFile(host.At(Paths::Samba)).value_or("");
+    if (!Membership::Read(host)) {
         RestoreOriginals(files);
     }
     // Again: the original of smb.conf may be that of a member.
-    if (!Membership::Read()) {
-        FinishParting(folders, deadline);
-        RemoveHostFile(Paths::OpenChange);
+    if (!Membership::Read(host)) {
+        FinishParting(host, folders, deadline);
     }
     RemoveTemporaryFiles(files);
+    return ReadHostFile(host.At(Paths::Samba)).value_or("") != before;
 }
 
-void FinishOpenChange(Clock::time_point deadline) {
-    if (!FileExists(Paths::OpenChange)) {
-        return;
-    }
-    if (auto const membership = Membership::Read()) {
-        LogWarning(
-            "parting from a domain that a join or a part which did not end has left in half; "
-            "an account that is there stays in the directory");
-        Dissolve(*membership, deadline);
-    }
+bool IsHalf(Host const& host) {
+    return FileExists(host.At(Paths::OpenChange));
+}
+
+std::string SecretsOfMember(SambaFolders const& folders) {
+    return ReadHostFile(SecretsOf(folders)).value_or("");
+}
+
+std::string SecretsBeforeJoin(Host const& host, SambaFolders const& folders) {
+    return ReadHostFile(IsHalf(host) ? BeforeJoinOf(folders) : SecretsOf(folders)).value_or("");
 }
 
 } // namespace tessel::winbind::LocalMembership

@@ -2,8 +2,11 @@
 #include "questions/Questions.h"
 
 #include "Failure.h"
+#include "Paths.h"
+#include "host/Host.h"
+#include "host/Membership.h"
+#include "host/PreferredControllers.h"
 #include "host/SystemLog.h"
-#include "questions/Directory.h"
 #include "questions/LastAnswer.h"
 #include "samba/BoundedCall.h"
 #include "samba/DirectorySearch.h"
@@ -49,17 +52,29 @@ bool Names(std::string_view name, Domain const& domain) {
                                EqualsIgnoringCase(wanted, domain.NetBIOSName()));
 }
 
+/// The controllers of `domain` as its DNS lists them, the preferred ones that it lists first.
+std::vector<std::string> FindDomainControllers(Host const& host, std::string const& domain) {
+    auto controllers = host.AskDNS(DomainName(domain));
+    auto const preferred = PreferredControllers(host.At(Paths::State)).Read();
+    std::stable_partition(controllers.begin(), controllers.end(), [&](std::string const& name) {
+        return std::any_of(preferred.begin(), preferred.end(), [&](std::string const& first) {
+            return EqualsIgnoringCase(first, name);
+        });
+    });
+    return controllers;
+}
+
 /// The host's domain; nothing where it has none.
-std::optional<Domain> Joined() {
-    Domain domain = GetActiveDomain();
+std::optional<Domain> Joined(Host const& host) {
+    Domain domain = GetActiveDomain(host);
     if (domain == Domain()) {
         return std::nullopt;
     }
     return domain;
 }
 
-Domain JoinedOrThrow() {
-    if (std::optional<Domain> const domain = Joined()) {
+Domain JoinedOrThrow(Host const& host) {
+    if (std::optional<Domain> const domain = Joined(host)) {
         return *domain;
     }
     throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "this host is joined to no domain");
@@ -120,22 +135,26 @@ std::vector<Domain> OtherDomains(WinbindClient const& client, Domain const& own)
 }
 
 /// The trusts of the host's domain that `filter` selects.
-std::vector<DirectoryEntry> SearchTrusts(std::string const& filter, Clock::time_point deadline) {
-    return SearchDirectory(
-        "", filter, {"trustPartner", "flatName", "trustDirection", "trustAttributes"}, deadline);
+std::vector<DirectoryEntry> SearchTrusts(Host const& host, std::string const& filter,
+                                         Clock::time_point deadline) {
+    return SearchDirectory(host, "", filter,
+                           {"trustPartner", "flatName", "trustDirection", "trustAttributes"},
+                           deadline);
 }
 
-std::vector<DirectoryEntry> AllTrusts(Clock::time_point deadline) {
-    return SearchTrusts("(objectClass=trustedDomain)", deadline);
+std::vector<DirectoryEntry> AllTrusts(Host const& host, Clock::time_point deadline) {
+    return SearchTrusts(host, "(objectClass=trustedDomain)", deadline);
 }
 
 /// Those to the domain `name`.
-std::vector<DirectoryEntry> FindTrusts(std::string const& name, Clock::time_point deadline) {
+std::vector<DirectoryEntry> FindTrusts(Host const& host, std::string const& name,
+                                       Clock::time_point deadline) {
     std::string const escaped = EscapedForFilter(WithoutRoot(name));
     if (escaped.empty()) {
         return {};
     }
-    return SearchTrusts("(&(objectClass=trustedDomain)(|(trustPartner=" + escaped +
+    return SearchTrusts(host,
+                        "(&(objectClass=trustedDomain)(|(trustPartner=" + escaped +
                             ")(flatName=" + escaped + ")))",
                         deadline);
 }
@@ -166,18 +185,18 @@ std::optional<Domain> FindRemembered(WinbindClient const& client, Domain const& 
 }
 
 /// The domain that `name` means, the host's own or one that it trusts.
-std::optional<Domain> FindDomain(WinbindClient const& client, Domain const& own,
+std::optional<Domain> FindDomain(Host const& host, WinbindClient const& client, Domain const& own,
                                  std::string const& name, Clock::time_point deadline) {
     if (auto remembered = FindRemembered(client, own, name)) {
         return remembered;
     }
-    std::vector<Domain> const trusted = DomainsOf(FindTrusts(name, deadline));
+    std::vector<Domain> const trusted = DomainsOf(FindTrusts(host, name, deadline));
     return trusted.empty() ? std::nullopt : std::optional<Domain>(trusted.front());
 }
 
-Domain FindDomainOrThrow(WinbindClient const& client, Domain const& own, std::string const& name,
-                         Clock::time_point deadline) {
-    if (std::optional<Domain> const domain = FindDomain(client, own, name, deadline)) {
+Domain FindDomainOrThrow(Host const& host, WinbindClient const& client, Domain const& own,
+                         std::string const& name, Clock::time_point deadline) {
+    if (std::optional<Domain> const domain = FindDomain(host, client, own, name, deadline)) {
         return *domain;
     }
     throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
@@ -186,7 +205,7 @@ Domain FindDomainOrThrow(WinbindClient const& client, Domain const& own, std::st
 
 /// The account name of the user that the canonical name `text` is of: its last part is the object's
 /// name, which may differ from the name that the user logs in with.
-std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& own,
+std::string AccountOfCanonicalName(Host const& host, WinbindClient const& client, Domain const& own,
                                    Domain const& domain, std::string const& text,
                                    std::string const& name, Clock::time_point deadline) {
     std::string const controller =
@@ -198,7 +217,7 @@ std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& ow
     };
     std::vector<std::string> accounts;
     for (DirectoryEntry const& entry : SearchDirectory(
-             controller,
+             host, controller,
              "(&(objectCategory=person)(objectClass=user)(cn=" + EscapedForFilter(name) + "))",
              {"canonicalName", "sAMAccountName"}, deadline)) {
         if (plain(ValueIn(entry, "canonicalName")) == plain(text)) {
@@ -214,8 +233,9 @@ std::string AccountOfCanonicalName(WinbindClient const& client, Domain const& ow
 /// The user of the principal name `text`. What it is of need not be a domain, nor what stands before
 /// it an account's name: a controller knows both by the user's own attribute. Only where it does not,
 /// they are taken as they look.
-std::string UserOfPrincipal(WinbindClient const& client, Domain const& own, UserName const& user,
-                            std::string const& text, Clock::time_point deadline) {
+std::string UserOfPrincipal(Host const& host, WinbindClient const& client, Domain const& own,
+                            UserName const& user, std::string const& text,
+                            Clock::time_point deadline) {
     std::optional<Domain> const domain = FindRemembered(client, own, user.domain);
     try {
         return client.GetUserName((domain ? *domain : own).NetBIOSName(), text);
@@ -224,8 +244,8 @@ std::string UserOfPrincipal(WinbindClient const& client, Domain const& own, User
             throw;
         }
     }
-    return client.GetUserName(FindDomainOrThrow(client, own, user.domain, deadline).NetBIOSName(),
-                              user.name);
+    return client.GetUserName(
+        FindDomainOrThrow(host, client, own, user.domain, deadline).NetBIOSName(), user.name);
 }
 
 /// This host's full name, as the join has registered it: what the resolver says of the machine's
@@ -248,6 +268,32 @@ std::string FullHostName(std::string const& machine, Domain const& own,
 }
 
 } // namespace
+
+Domain GetActiveDomain(Host const& host) {
+    auto const membership = Membership::Read(host);
+    return membership ? Domain(membership->DNSName(), membership->domain.workgroup) : Domain();
+}
+
+std::string GetMachineAccountDN(Host const& host) {
+    static constexpr char attribute[] = "distinguishedName";
+    auto const membership = Membership::Read(host);
+    if (!membership) {
+        return {};
+    }
+    std::string const& computer = membership->domain.netbiosName;
+    auto const entries = SearchDirectory(
+        host, "", "(sAMAccountName=" + EscapedForFilter(computer) + "$)", {attribute}, Deadline());
+    std::string name = entries.empty() ? std::string() : ValueIn(entries.front(), attribute);
+    if (name.empty()) {
+        throw Failure(TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT,
+                      "the directory has no account '" + computer + "$'");
+    }
+    return name;
+}
+
+std::vector<std::string> GetPreferredDomainControllers(Host const& host) {
+    return PreferredControllers(host.At(Paths::State)).Read();
+}
 
 int TrustStateOf(ActiveDirectoryClientErrorCode code) {
     switch (code) {
@@ -279,9 +325,9 @@ int TrustStateOf(ActiveDirectoryClientErrorCode code) {
     }
 }
 
-int GetDomainTrustState() {
+int GetDomainTrustState(Host const& host) {
     Clock::time_point const deadline = Deadline();
-    if (!Joined()) {
+    if (!Joined(host)) {
         return TSLAUTH_WINBIND_TRUST_NOT_JOINED;
     }
     try {
@@ -301,9 +347,9 @@ int GetDomainTrustState() {
     }
 }
 
-std::vector<Domain> GetTrustedDomains() {
+std::vector<Domain> GetTrustedDomains(Host const& host) {
     Clock::time_point const deadline = Deadline();
-    std::optional<Domain> const own = Joined();
+    std::optional<Domain> const own = Joined(host);
     if (!own) {
         return {};
     }
@@ -312,7 +358,7 @@ std::vector<Domain> GetTrustedDomains() {
     return last.Get(*own, [&] {
         // A domain behind another one is nobody's trust in the directory, and known once it was met.
         std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
-        std::vector<Domain> domains = DomainsOf(AllTrusts(deadline));
+        std::vector<Domain> domains = DomainsOf(AllTrusts(host, deadline));
         for (Domain const& domain : remembered) {
             if (!Contains(domains, domain)) {
                 domains.push_back(domain);
@@ -322,11 +368,12 @@ std::vector<Domain> GetTrustedDomains() {
     });
 }
 
-std::string GetAnyDomainController(std::string const& site, std::string const& domain) {
+std::string GetAnyDomainController(Host const& host, std::string const& site,
+                                   std::string const& domain) {
     Clock::time_point const deadline = Deadline();
-    std::optional<Domain> const own = Joined();
+    std::optional<Domain> const own = Joined(host);
     if (!own) {
-        std::vector<std::string> const found = FindDomainControllers(domain);
+        std::vector<std::string> const found = FindDomainControllers(host, domain);
         if (found.empty()) {
             throw Failure(TSLAUTH_PROVIDER_NO_LOGON_SERVERS,
                           "DNS lists no controller of '" + domain + "'");
@@ -335,7 +382,7 @@ std::string GetAnyDomainController(std::string const& site, std::string const& d
     }
     WinbindClient const client(deadline);
     bool const hasDNSName = domain.find('.') != std::string::npos;
-    auto const find = [&] { return FindDomain(client, *own, domain, deadline); };
+    auto const find = [&] { return FindDomain(host, client, *own, domain, deadline); };
     std::optional<Domain> const known = hasDNSName ? FindRemembered(client, *own, domain) : find();
     try {
         // By its DNS name, where it has one: that is the name that sites and DNS know.
@@ -350,40 +397,40 @@ std::string GetAnyDomainController(std::string const& site, std::string const& d
     }
 }
 
-std::string ConvertCanonicalUsername(std::string const& name) {
+std::string ConvertCanonicalUsername(Host const& host, std::string const& name) {
     Clock::time_point const deadline = Deadline();
     UserName const user = ReadUserName(name);
-    Domain const own = JoinedOrThrow();
+    Domain const own = JoinedOrThrow(host);
     WinbindClient const client(deadline);
     switch (user.form) {
     case UserName::Form::canonical: {
-        Domain const domain = FindDomainOrThrow(client, own, user.domain, deadline);
+        Domain const domain = FindDomainOrThrow(host, client, own, user.domain, deadline);
         return client.GetUserName(
             domain.NetBIOSName(),
-            AccountOfCanonicalName(client, own, domain, name, user.name, deadline));
+            AccountOfCanonicalName(host, client, own, domain, name, user.name, deadline));
     }
     case UserName::Form::principal:
-        return UserOfPrincipal(client, own, user, name, deadline);
+        return UserOfPrincipal(host, client, own, user, name, deadline);
     case UserName::Form::downLevel:
         break;
     }
-    return client.GetUserName(FindDomainOrThrow(client, own, user.domain, deadline).NetBIOSName(),
-                              user.name);
+    return client.GetUserName(
+        FindDomainOrThrow(host, client, own, user.domain, deadline).NetBIOSName(), user.name);
 }
 
-std::string GetHostPrincipalForDomain(std::string const& domain) {
+std::string GetHostPrincipalForDomain(Host const& host, std::string const& domain) {
     Clock::time_point const deadline = Deadline();
-    Domain const own = JoinedOrThrow();
+    Domain const own = JoinedOrThrow(host);
     WinbindClient const client(deadline);
-    (void)FindDomainOrThrow(client, own, domain,
+    (void)FindDomainOrThrow(host, client, own, domain,
                             deadline); // the principal is the same for all of them
     return "host/" + FullHostName(Lower(client.GetHost().netBIOSName), own, deadline) + "@" +
            Upper(own.DNSName());
 }
 
-int GetDomainTrustRelationship(std::string const& domain) {
+int GetDomainTrustRelationship(Host const& host, std::string const& domain) {
     Clock::time_point const deadline = Deadline();
-    std::optional<Domain> const own = Joined();
+    std::optional<Domain> const own = Joined(host);
     if (!own) {
         return 0;
     }
@@ -392,7 +439,7 @@ int GetDomainTrustRelationship(std::string const& domain) {
                TSLAUTH_WINBIND_TRUST_INBOUND | TSLAUTH_WINBIND_TRUST_OUTBOUND;
     }
     // winbindd, on a member, knows neither direction nor kind.
-    std::vector<DirectoryEntry> const trusts = FindTrusts(domain, deadline);
+    std::vector<DirectoryEntry> const trusts = FindTrusts(host, domain, deadline);
     if (!trusts.empty()) {
         return DirectRelationship(trusts.front());
     }

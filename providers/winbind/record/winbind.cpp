@@ -1,9 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Failure.h"
-#include "questions/Directory.h"
+#include "join/ControllerPreference.h"
+#include "join/DomainJoin.h"
+#include "join/DomainPart.h"
 #include "questions/LastAnswer.h"
 #include "questions/Questions.h"
 #include "record/Boundary.h"
+#include "samba/ThisHost.h"
 #include "tslauth_winbind_provider.h"
 
 #include <memory>
@@ -34,7 +37,8 @@ static int JoinDomainEntry(char const* domain, char const* organisationalUnit,
                            ActiveDirectoryClientCredentials const* credentials) {
     return CodeOf("join domain", [&] {
         RequireBoth(*credentials);
-        JoinDomain(domain, TextOrEmpty(organisationalUnit), *credentials);
+        DomainJoin::WithCredentials(ThisHost(), domain, TextOrEmpty(organisationalUnit),
+                                    *credentials);
     });
 }
 
@@ -43,13 +47,14 @@ static int PartDomainEntry(ActiveDirectoryClientCredentials const* credentials) 
         if (credentials != nullptr) {
             RequireBoth(*credentials);
         }
-        PartDomain(credentials);
+        PartFromDomain(ThisHost(), credentials);
     });
 }
 
 static int GetActiveDomainEntry(ActiveDirectoryClientDomain* domain,
                                 ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("get active domain", [&] { HandOut(GetActiveDomain(), domain, release); });
+    return CodeOf("get active domain",
+                  [&] { HandOut(GetActiveDomain(ThisHost()), domain, release); });
 }
 
 static int SetPreferredDomainControllersEntry(char const** controllers) {
@@ -58,63 +63,71 @@ static int SetPreferredDomainControllersEntry(char const** controllers) {
         for (char const* const* name = controllers; *name != nullptr; ++name) {
             names.emplace_back(*name);
         }
-        SetPreferredDomainControllers(names);
+        SetPreferredDomainControllers(ThisHost(), names);
     });
 }
 
 static int GetPreferredDomainControllersEntry(char*** controllers,
                                               ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("get preferred domain controllers",
-                  [&] { HandOut(GetPreferredDomainControllers(), controllers, release); });
+    return CodeOf("get preferred domain controllers", [&] {
+        HandOut(GetPreferredDomainControllers(ThisHost()), controllers, release);
+    });
 }
 
 static int GetDomainTrustStateEntry() {
     return ValueOf("get domain trust state", TSLAUTH_WINBIND_TRUST_UNKNOWN,
-                   [] { return GetDomainTrustState(); });
+                   [] { return GetDomainTrustState(ThisHost()); });
 }
 
 static int GetTrustedDomainsEntry(ActiveDirectoryClientDomain*** domains,
                                   ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("get trusted domains", [&] { HandOut(GetTrustedDomains(), domains, release); });
+    return CodeOf("get trusted domains",
+                  [&] { HandOut(GetTrustedDomains(ThisHost()), domains, release); });
 }
 
 static int GetMachineAccountDNEntry(char** name, ActiveDirectoryClientFreeFunction* release) {
     return CodeOf("get machine account DN", [&] {
         static LastAnswer<std::string>& last =
             *std::make_unique<LastAnswer<std::string>>().release(); // as long as any thread
-        HandOut(last.Get(GetActiveDomain(), [] { return GetMachineAccountDN(); }), name, release);
+        HandOut(
+            last.Get(GetActiveDomain(ThisHost()), [] { return GetMachineAccountDN(ThisHost()); }),
+            name, release);
     });
 }
 
 static int GetAnyDomainControllerEntry(char const* first, char const* domain, char** controller,
                                        ActiveDirectoryClientFreeFunction* release) {
     return CodeOf("get any domain controller", [&] {
-        HandOut(GetAnyDomainController(TextOrEmpty(first), domain), controller, release);
+        HandOut(GetAnyDomainController(ThisHost(), TextOrEmpty(first), domain), controller,
+                release);
     });
 }
 
 static int ConvertCanonicalUsernameEntry(char const* name, char** canonicalName,
                                          ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("convert canonical user name",
-                  [&] { HandOut(ConvertCanonicalUsername(name), canonicalName, release); });
+    return CodeOf("convert canonical user name", [&] {
+        HandOut(ConvertCanonicalUsername(ThisHost(), name), canonicalName, release);
+    });
 }
 
 static int
 JoinDomainWithMachineAccountEntry(ActiveDirectoryClientDomainInformation const* domainInformation,
                                   ActiveDirectoryClientMachineAccount const* account) {
-    return CodeOf("join domain with machine account",
-                  [&] { JoinDomainWithMachineAccount(*domainInformation, *account); });
+    return CodeOf("join domain with machine account", [&] {
+        DomainJoin::WithMachineAccount(ThisHost(), *domainInformation, *account);
+    });
 }
 
 static int GetHostPrincipalForDomainEntry(char const* domain, char** principal,
                                           ActiveDirectoryClientFreeFunction* release) {
-    return CodeOf("get host principal for domain",
-                  [&] { HandOut(GetHostPrincipalForDomain(domain), principal, release); });
+    return CodeOf("get host principal for domain", [&] {
+        HandOut(GetHostPrincipalForDomain(ThisHost(), domain), principal, release);
+    });
 }
 
 static int GetDomainTrustRelationshipEntry(char const* domain) {
     return ValueOf("get domain trust relationship", 0,
-                   [&] { return GetDomainTrustRelationship(domain); });
+                   [&] { return GetDomainTrustRelationship(ThisHost(), domain); });
 }
 
 ActiveDirectoryClientMetadataRecord const ActiveDirectoryClientMetadata = {

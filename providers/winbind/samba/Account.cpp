@@ -3,7 +3,7 @@
 
 #include "Failure.h"
 
-#include <cctype>
+#include <base/AsciiText.h>
 #include <string>
 #include <string_view>
 
@@ -24,7 +24,7 @@ void CheckName(std::string_view name) {
                       "the user name is empty, or has a blank at an end");
     }
     for (char const c : name) {
-        if (std::iscntrl(static_cast<unsigned char>(c)) != 0) {
+        if (base::AsciiText::IsControl(c)) {
             throw Failure(TSLAUTH_PROVIDER_INVALID_ACCOUNT_NAME,
                           "the user name holds a control character");
         }

@@ -2,8 +2,9 @@
 #include "samba/DirectorySearch.h"
 
 #include "Failure.h"
-#include "host/ChildProcess.h"
-#include "samba/StagingFolder.h"
+#include "Paths.h"
+#include "host/Host.h"
+#include "host/StagingFolder.h"
 #include "text/ToolFailure.h"
 #include <base/AsciiText.h>
 
@@ -39,13 +40,13 @@ std::vector<DirectoryEntry> ReadDirectoryEntries(std::string_view text) {
     return entries;
 }
 
-std::vector<DirectoryEntry> SearchDirectory(std::string const& controller,
+std::vector<DirectoryEntry> SearchDirectory(Host const& host, std::string const& controller,
                                             std::string const& filter,
                                             std::vector<std::string> const& attributes,
-                                            BoundedCall::Clock::time_point deadline) {
+                                            Clock::time_point deadline) {
     // What `net` remembers is its own: in the lock folder of the host, winbindd and every later `net`
     // would go on for a minute without a controller that has not answered once.
-    StagingFolder const scratch;
+    StagingFolder const scratch(host.At(Paths::Staging));
     ChildProcess::Task task{
         {"net", "ads", "search", "--machine-pass", "--option=lock directory=" + scratch.Memory()}};
     if (!controller.empty()) {
@@ -53,7 +54,7 @@ std::vector<DirectoryEntry> SearchDirectory(std::string const& controller,
     }
     task.arguments.push_back(filter);
     task.arguments.insert(task.arguments.end(), attributes.begin(), attributes.end());
-    ChildProcess::Outcome const outcome = ChildProcess::Run(task, deadline);
+    ChildProcess::Outcome const outcome = host.Run(task, deadline);
     if (outcome.timedOut) {
         throw Failure(TSLAUTH_PROVIDER_TIMED_OUT,
                       "net ads search " + filter + ": no answer in time");

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
-#include "samba/BoundedCall.h"
+#include "host/ChildProcess.h"
 
 #include <map>
 #include <string>
@@ -11,6 +11,8 @@
 /// What the directory itself says, asked with the host's own account through `net ads search`. For
 /// what winbindd does not know; it takes a quarter of a second and a controller that answers.
 namespace tessel::winbind {
+
+class Host;
 
 /// One object: its attributes, several of a name in the order of the directory. The names are in the
 /// case of the question.
@@ -26,9 +28,9 @@ std::vector<DirectoryEntry> ReadDirectoryEntries(std::string_view text);
 /// @param filter as RFC 4515 has it; names in it are escaped by the caller
 /// @param attributes those to return
 /// @throws Failure
-std::vector<DirectoryEntry> SearchDirectory(std::string const& controller,
+std::vector<DirectoryEntry> SearchDirectory(Host const& host, std::string const& controller,
                                             std::string const& filter,
                                             std::vector<std::string> const& attributes,
-                                            BoundedCall::Clock::time_point deadline);
+                                            Clock::time_point deadline);
 
 } // namespace tessel::winbind

@@ -5,29 +5,20 @@
 #include "text/ControllerAnswer.h"
 
 #include <string>
-#include <string_view>
 #include <vector>
 
 namespace tessel::winbind {
 
+class Host;
 class SambaTools;
 
 /// Finds a domain's controllers: DNS names them, and each of them is asked what it is.
 namespace DomainDiscovery {
 
-/// The controllers of `domain` in the order of DNS (priority, then weight). No state of the C
-/// library's resolver is shared, and no answer is waited for longer than 8 seconds.
-/// @throws Failure 1355 where DNS knows no such domain or cannot be asked, 10060 where it is silent
-std::vector<std::string> AskDNS(std::string const& domain);
-
-/// The names that an answer of DNS to a question for SRV records holds, in their order. Names that
-/// are no host's are left out: they would become arguments of a program.
-/// @throws Failure 1355 for what is no such answer
-std::vector<std::string> ReadServices(std::string_view answer);
-
 /// The first writable controller of `domain` that answers: the preferred ones, then DNS's.
-/// @throws Failure as `AskDNS` where DNS is needed, 1311 where none of them answers by `deadline`
-ControllerAnswer FindController(SambaTools const& tools, std::string const& domain,
+/// @throws Failure as `Host::AskDNS` where DNS is needed, 1311 where none of them answers by `deadline`
+ControllerAnswer FindController(Host const& host, SambaTools const& tools,
+                                std::string const& domain,
                                 std::vector<std::string> const& preferred,
                                 Clock::time_point deadline);
 
@@ -39,7 +30,7 @@ bool IsNameOfController(std::string const& computer, ControllerAnswer const& ans
 /// Keeps a host from the name of a controller: Samba's `net` joins as any account that the user may
 /// change, and a controller whose secret is changed serves nobody any more.
 /// @throws Failure 1210
-void CheckHostName(std::string const& computer, ControllerAnswer const& answer,
+void CheckHostName(Host const& host, std::string const& computer, ControllerAnswer const& answer,
                    std::string const& domain);
 
 /// @throws Failure 1398 where the controller's clock and the host's are more apart than Kerberos

@@ -3,13 +3,15 @@
 
 #include "Failure.h"
 #include "Paths.h"
+#include "host/Host.h"
 #include "host/HostFile.h"
+#include "host/StagingFolder.h"
 #include "samba/DirectorySearch.h"
-#include "samba/StagingFolder.h"
 #include "text/DirectoryNames.h"
 #include "text/ToolFailure.h"
 
 #include <algorithm>
+#include <cstring>
 #include <initializer_list>
 #include <string_view>
 #include <utility>
@@ -36,13 +38,20 @@ void Append(ChildProcess::Task& task, std::initializer_list<char const*> argumen
 
 [[noreturn]] void ThrowToolFailure(ChildProcess::Task const& task,
                                    ChildProcess::Outcome const& outcome) {
-    throw Failure(ToolFailureCode(outcome.output),
-                  "'" + CommandOf(task) + "': " + ToolFailureText(outcome.output));
+    std::string const ended = outcome.signal == 0
+                                  ? ""
+                                  : "ended by signal " + std::to_string(outcome.signal) + " (" +
+                                        ::sigdescr_np(outcome.signal) + "); ";
+    // What one that was ended had said by then need not be why.
+    throw Failure(outcome.signal == 0 ? ToolFailureCode(outcome.output)
+                                      : TSLAUTH_WINBIND_SEE_SYSTEM_LOG,
+                  "'" + CommandOf(task) + "': " + ended + ToolFailureText(outcome.output));
 }
 
 /// The output of a task that succeeds.
-std::string RunToSuccess(ChildProcess::Task const& task, Clock::time_point deadline) {
-    ChildProcess::Outcome outcome = ChildProcess::Run(task, deadline);
+std::string RunToSuccess(Host const& host, ChildProcess::Task const& task,
+                         Clock::time_point deadline) {
+    ChildProcess::Outcome outcome = host.Run(task, deadline);
     if (outcome.timedOut) {
         ThrowTimedOut(task);
     }
@@ -66,14 +75,16 @@ std::string AfterLineStart(std::string_view text, std::string const& start) {
 
 } // namespace
 
-SambaFolders SambaFolders::Read(Clock::time_point deadline) {
+SambaFolders ReadSambaFolders(Host const& host, Clock::time_point deadline) {
+    std::string const own = host.At(Paths::Samba);
     ChildProcess::Task task;
-    Append(task, {"testparm", "-s", "-v", FileExists(Paths::Samba) ? Paths::Samba : "/dev/null"});
-    std::string const text = '\n' + RunToSuccess(task, deadline);
+    Append(task, {"testparm", "-s", "-v", FileExists(own) ? own.c_str() : "/dev/null"});
+    std::string const text = '\n' + RunToSuccess(host, task, deadline);
     auto const value = [&](char const* name) {
         std::string found = AfterLineStart(text, std::string("\t") + name + " = ");
         if (found.empty()) {
-            throw Failure(SeeSystemLog, std::string("testparm does not print '") + name + "'");
+            throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG,
+                          std::string("testparm does not print '") + name + "'");
         }
         return found;
     };
@@ -90,8 +101,10 @@ SambaFolders SambaFolders::Read(Clock::time_point deadline) {
     return folders;
 }
 
-SambaTools::SambaTools(StagingFolder const& staging)
-    : _configuration(staging.Configuration()),
+SambaTools::SambaTools(Host const& host) : _host(&host) {}
+
+SambaTools::SambaTools(Host const& host, StagingFolder const& staging)
+    : _host(&host), _configuration(staging.Configuration()),
       _kerberosConfiguration(staging.KerberosConfiguration()) {}
 
 ChildProcess::Task SambaTools::Task() const {
@@ -113,14 +126,14 @@ ControllerAnswer SambaTools::Lookup(std::string const& controller,
                                     Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     Append(task, {"ads", "lookup", "-S", controller.c_str()});
-    return ReadControllerAnswer(RunToSuccess(task, deadline));
+    return ReadControllerAnswer(RunToSuccess(*_host, task, deadline));
 }
 
 std::optional<std::chrono::seconds> SambaTools::ClockOffset(std::string const& controller,
                                                             Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     Append(task, {"ads", "info", "-S", controller.c_str()});
-    return ReadServerTimeOffset(RunToSuccess(task, deadline));
+    return ReadServerTimeOffset(RunToSuccess(*_host, task, deadline));
 }
 
 void SambaTools::Join(std::string const& controller, Account const& account,
@@ -131,14 +144,14 @@ void SambaTools::Join(std::string const& controller, Account const& account,
     if (!unit.empty()) {
         task.arguments.push_back("createcomputer=" + unit);
     }
-    (void)RunToSuccess(task, deadline); // it prints what the caller knows
+    (void)RunToSuccess(*_host, task, deadline); // it prints what the caller knows
 }
 
 void SambaTools::JoinOffline(SecretFile const& blob, Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     Append(task, {"offlinejoin", "requestodj", "loadfile=/proc/self/fd/3"});
     task.secrets = {&blob};
-    (void)RunToSuccess(task, deadline);
+    (void)RunToSuccess(*_host, task, deadline);
 }
 
 void SambaTools::Leave(std::string const& controller, Account const* account,
@@ -150,7 +163,16 @@ void SambaTools::Leave(std::string const& controller, Account const* account,
     } else {
         Append(task, {"-P"});
     }
-    (void)RunToSuccess(task, deadline);
+    (void)RunToSuccess(*_host, task, deadline);
+}
+
+void SambaTools::DeleteAccount(std::string const& controller, std::string const& computer,
+                               Account const& account, Clock::time_point deadline) const {
+    ChildProcess::Task task = Task();
+    Append(task, {"ads", "user", "delete", "-S", controller.c_str()});
+    account.AddTo(task);
+    task.arguments.push_back(computer + '$');
+    (void)RunToSuccess(*_host, task, deadline);
 }
 
 std::string SambaTools::ComputerAttribute(std::string const& controller,
@@ -162,7 +184,7 @@ std::string SambaTools::ComputerAttribute(std::string const& controller,
     account.AddTo(task);
     task.arguments.push_back("(sAMAccountName=" + EscapedForFilter(computer) + "$)");
     task.arguments.push_back(attribute);
-    auto const entries = ReadDirectoryEntries(RunToSuccess(task, deadline));
+    auto const entries = ReadDirectoryEntries(RunToSuccess(*_host, task, deadline));
     return entries.empty() ? std::string() : ValueIn(entries.front(), attribute);
 }
 
@@ -170,7 +192,7 @@ bool SambaTools::HasMachineSecret(Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     // Prints no password, unless it is asked to.
     Append(task, {"primarytrust", "dumpinfo"});
-    ChildProcess::Outcome const outcome = ChildProcess::Run(task, deadline);
+    ChildProcess::Outcome const outcome = _host->Run(task, deadline);
     if (outcome.timedOut) {
         ThrowTimedOut(task);
     }

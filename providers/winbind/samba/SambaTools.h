@@ -2,6 +2,7 @@
 #pragma once
 
 #include "host/ChildProcess.h"
+#include "host/SambaFolders.h"
 #include "samba/Account.h"
 #include "text/ControllerAnswer.h"
 
@@ -13,31 +14,23 @@ namespace tessel::winbind {
 
 class StagingFolder;
 
-/// The folders in which the Samba of this host keeps its files.
-struct SambaFolders {
-    std::string secrets; ///< "private dir"
-    std::string state;
-    std::string cache;
-    std::string lock;
-    std::string pid;
-    /// The host's role, as `server role` and `security` together make it.
-    bool isDomainMember = false;
-    bool isDomainController = false;
+class Host;
 
-    /// As Samba itself resolves them from the host's smb.conf, or without it where there is none.
-    /// @throws Failure also where Samba cannot read its file
-    static SambaFolders Read(Clock::time_point deadline);
-};
+/// The folders and the role of a host, as Samba itself resolves them from the host's smb.conf, or
+/// without it where there is none.
+/// @throws Failure also where Samba cannot read its file
+SambaFolders ReadSambaFolders(Host const& host, Clock::time_point deadline);
 
 /// Samba's `net`, with the configuration of a staging folder or the host's own. Every call runs it
 /// once, ends it at the deadline (`Failure` 10060), and throws a `Failure` with the code that its
 /// text stands for. A value, for any number of threads.
 class SambaTools {
 public:
-    /// With the host's configuration.
-    SambaTools() = default;
+    /// With the host's own configuration.
+    /// @param host which must outlive it
+    explicit SambaTools(Host const& host);
 
-    explicit SambaTools(StagingFolder const& staging);
+    SambaTools(Host const& host, StagingFolder const& staging);
 
     /// What a controller says of itself; one datagram each way, and no account.
     ControllerAnswer Lookup(std::string const& controller, Clock::time_point deadline) const;
@@ -58,6 +51,10 @@ public:
     void Leave(std::string const& controller, Account const* account,
                Clock::time_point deadline) const;
 
+    /// Deletes a computer's account, also where there is no secret of it.
+    void DeleteAccount(std::string const& controller, std::string const& computer,
+                       Account const& account, Clock::time_point deadline) const;
+
     /// The first value of an attribute of a computer; empty where it has none, or does not exist.
     std::string ComputerAttribute(std::string const& controller, std::string const& computer,
                                   std::string const& attribute, Account const& account,
@@ -69,6 +66,7 @@ public:
 private:
     ChildProcess::Task Task() const;
 
+    Host const* _host;
     std::string _configuration; ///< empty: the host's, here and below
     std::string _kerberosConfiguration;
 };

@@ -5,12 +5,12 @@
 #include "Paths.h"
 #include "host/HostFile.h"
 #include "host/SystemLog.h"
-#include "samba/SambaTools.h"
 #include "samba/WinbindClient.h"
 #include "text/ToolFailure.h"
 
 #include <algorithm>
 #include <array>
+#include <base/AsciiText.h>
 #include <cerrno>
 #include <climits>
 #include <csignal>
@@ -75,10 +75,6 @@ std::string ProgramOf(pid_t process) {
     return name.substr(0, name.find(' ')); // a program that was replaced has a word behind its path
 }
 
-bool StartsWith(std::string const& text, std::string const& start) {
-    return text.compare(0, start.size(), start) == 0;
-}
-
 bool WaitForEnd(pid_t process, Clock::time_point deadline) {
     while (::kill(process, 0) == 0) {
         if (Clock::now() >= deadline) {
@@ -122,7 +118,8 @@ std::vector<pid_t> WinbindDaemon::Companions() const {
             static_cast<pid_t>(std::strtol(entry->path().filename().c_str(), nullptr, 10));
         std::string const name = process > 1 ? ProgramOf(process) : std::string();
         if (name == daemonProgram ||
-            (withServers && (name == helperProgram || StartsWith(name, serverPrefix)))) {
+            (withServers &&
+             (name == helperProgram || base::AsciiText::StartsWith(name, serverPrefix)))) {
             found.push_back(process);
         }
     }
@@ -203,7 +200,7 @@ void WinbindDaemon::Reload() const noexcept {
     }
 }
 
-void WinbindDaemon::CheckTrust(Clock::time_point deadline) {
+void WinbindDaemon::CheckTrust(Clock::time_point deadline) const {
     // A controller that has not heard of a new secret yet hears of it soon, or another one is asked.
     auto const certain = std::min(deadline, Clock::now() + refusalPatience);
     for (;;) {

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "text/ToolFailure.h"
 
+#include "tslauth_winbind_provider.h"
+
 #include <base/AsciiText.h>
 
 #include <algorithm>
@@ -213,7 +215,7 @@ ActiveDirectoryClientErrorCode ToolFailureCode(std::string_view output) {
             return known.code;
         }
     }
-    return UnnamedFailure;
+    return TSLAUTH_WINBIND_SEE_SYSTEM_LOG;
 }
 
 std::string ToolFailureText(std::string_view output) {

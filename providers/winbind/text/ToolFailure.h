@@ -10,11 +10,8 @@
 /// tells them apart.
 namespace tessel::winbind {
 
-/// "See the system log": a failure that no code names.
-constexpr ActiveDirectoryClientErrorCode UnnamedFailure = 0xFFFF0000;
-
 /// The code that names best what `output`, the standard output and error of `net` together, says;
-/// UnnamedFailure where nothing in it is known. Never 0, also for the output of a success.
+/// TSLAUTH_WINBIND_SEE_SYSTEM_LOG where nothing in it is known. Never 0, also for the output of a success.
 ActiveDirectoryClientErrorCode ToolFailureCode(std::string_view output);
 
 /// `output` as one line for the system log: without blank lines, debug headers and control

@@ -29,8 +29,8 @@ TEST(BoundaryTest, AnEntryThatReturnsIsASuccess) {
 TEST(BoundaryTest, AFailureIsItsCode) {
     EXPECT_EQ(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
               CodeOfThrowing(Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "none")));
-    EXPECT_EQ(0xFFFF0001U,
-              static_cast<ActiveDirectoryClientErrorCode>(CodeOfThrowing(Failure(0xFFFF0001, ""))));
+    EXPECT_EQ(TSLAUTH_WINBIND_ACCOUNT_LEFT,
+              static_cast<ActiveDirectoryClientErrorCode>(CodeOfThrowing(Failure(TSLAUTH_WINBIND_ACCOUNT_LEFT, ""))));
 }
 
 TEST(BoundaryTest, AFailureWithoutACodeIsNoSuccess) {

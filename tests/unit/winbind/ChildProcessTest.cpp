@@ -101,7 +101,7 @@ TEST(ChildProcessTest, ReportsAProgramThatCannotBeExecuted) {
         ChildProcess::Run(task, Clock::now() + seconds(10));
         FAIL();
     } catch (Failure const& e) {
-        EXPECT_EQ(SeeSystemLog, e.Code());
+        EXPECT_EQ(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, e.Code());
         EXPECT_EQ("cannot start '" + path + "': Exec format error", e.what());
     }
 }

@@ -135,8 +135,8 @@ TEST(HostFileTest, AMarkIsThereUntilTheChangesAreKeptOrTakenBack) {
     TemporaryFolder const folder;
     for (bool const isKept : {true, false}) {
         HostChanges changes;
-        changes.Mark(folder / "mark");
-        EXPECT_EQ("", Contents(folder / "mark"));
+        changes.Mark(folder / "mark", "what for");
+        EXPECT_EQ("what for", Contents(folder / "mark"));
         if (isKept) {
             changes.Keep();
         } else {

@@ -18,7 +18,7 @@ namespace {
 ActiveDirectoryClientErrorCode CodeIn(std::string const& name) {
     auto const stem = std::filesystem::path(name).filename().string();
     return stem.compare(0, 7, "unnamed") == 0
-               ? UnnamedFailure
+               ? TSLAUTH_WINBIND_SEE_SYSTEM_LOG
                : static_cast<ActiveDirectoryClientErrorCode>(std::stoul(stem));
 }
 
@@ -130,7 +130,7 @@ TEST(ToolFailureTest, EveryCodeHasAClass) {
 #undef TSLAUTH_CODE
     for (auto const& name : GoldenNames("net", ".txt")) {
         auto const code = ToolFailureCode(GoldenText(name));
-        EXPECT_TRUE(code == UnnamedFailure ||
+        EXPECT_TRUE(code == TSLAUTH_WINBIND_SEE_SYSTEM_LOG ||
                     std::count(std::begin(mapped), std::end(mapped), code) == 1)
             << name;
     }

@@ -3,6 +3,7 @@
 
 #include "text/SambaDomain.h"
 
+#include <base/Descriptor.h>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -14,8 +15,9 @@ namespace tessel::winbind {
 /// with everything in it.
 class StagingFolder {
 public:
+    /// @param pattern of its path, as mkdtemp(3) takes it
     /// @throws Failure
-    StagingFolder();
+    explicit StagingFolder(std::string const& pattern);
     StagingFolder(StagingFolder const&) = delete;
     StagingFolder& operator=(StagingFolder const&) = delete;
     ~StagingFolder();
@@ -41,13 +43,15 @@ public:
         return _path + "/krb5.conf";
     }
 
-    /// Removes the folders of operations that did not end. To be called under the lock alone.
-    static void RemoveLeftOvers() noexcept;
+    /// Removes the folders of operations that did not end. One that is in use, a question's for one,
+    /// is held by its user and stays.
+    static void RemoveLeftOvers(std::string const& pattern) noexcept;
 
 private:
     std::string SecretsPath() const;
 
     std::string _path;
+    base::Descriptor _hold; ///< locked as long as the folder is in use
 };
 
 } // namespace tessel::winbind
