@@ -91,7 +91,7 @@ TEST(LosslessPAMPolicyTest, GoldenFilesAreEditedWithoutLoss) {
         tally.Add(Contents(path));
     }
     EXPECT_EQ(tally.broken, "");
-    EXPECT_EQ(tally.refused, 0U);
+    EXPECT_EQ(tally.refused, 1U) << "the one with NUL bytes";
     EXPECT_GE(tally.unreadable, 10U);
     EXPECT_GE(tally.compared, 20U);
 }
@@ -125,7 +125,7 @@ TEST(LosslessPAMPolicyTest, GeneratedFilesAreEditedWithoutLoss) {
     EXPECT_EQ(tally.broken, "");
     EXPECT_GT(tally.compared, 1200U);
     EXPECT_GT(tally.unreadable, 160U);
-    EXPECT_LT(tally.refused, 400U);
+    EXPECT_LT(tally.refused, 700U);
 }
 
 } // namespace

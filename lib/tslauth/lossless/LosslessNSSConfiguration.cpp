@@ -230,6 +230,7 @@ std::string LosslessNSSConfiguration(std::string_view text, Edit edit, NSSServic
     std::string edited(text);
     switch (edit) {
     case Edit::insert:
+        RefuseNul(text);
         edited = WithMissingLines(text);
         for (auto const database : EditedDatabases) {
             edited = WithService(edited, database, service);

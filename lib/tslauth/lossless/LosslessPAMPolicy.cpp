@@ -166,6 +166,7 @@ std::string LosslessPAMPolicy(std::string_view text, Edit edit, PAMEntry const& 
     std::string edited(text);
     switch (edit) {
     case Edit::insert:
+        RefuseNul(text);
         if (tslauthctl::ReadPAMMeaning(text).unreadable) {
             throw ConfigurationError("libpam refuses the policy: its last line is continued, or a "
                                      "line is too long");

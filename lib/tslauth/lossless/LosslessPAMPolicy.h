@@ -17,9 +17,9 @@ namespace tessel::authentication::ProviderModules {
 /// `insert`: as `EditedPAMPolicy`, one line in "auth" and one in "account".
 /// `remove`: takes every equal entry out of both, also a copy that only libpam understands. It
 /// undoes an insertion byte for byte.
-/// @throws ConfigurationError where libpam, or the model if it can read the outcome, would not find
-/// the entry where it belongs: behind a continued line that the model does not know as one, say. Also for an insertion into
-/// a policy that libpam refuses as a whole
+/// @throws ConfigurationError for an insertion after which libpam, or the model if it can read the
+/// outcome, would not find the entry where it belongs: behind a continued line that the model does
+/// not know as one, say. Also for one into a policy that libpam refuses, or that holds a NUL byte
 std::string LosslessPAMPolicy(std::string_view text, Edit edit,
                               SystemConfiguration::PAMEntry const& entry);
 

@@ -1,11 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include <tslauth/Exceptions.h>
+
 #include <cstddef>
 #include <string>
 #include <string_view>
 
-/// Whole lines that come into a text and go again, so that the one undoes the other byte for byte.
+/// What edits of texts have in common: whole lines that come and go again, so that the one undoes the
+/// other byte for byte.
 namespace tessel::authentication {
 
 /// Where the line that holds the byte at `position` begins.
@@ -38,6 +41,14 @@ inline std::string WithoutLines(std::string_view text, std::size_t begin, std::s
     }
     out += text.substr(end);
     return out;
+}
+
+/// What stands behind a NUL byte only some readers see.
+/// @throws ConfigurationError for a text with such a byte
+inline void RefuseNul(std::string_view text) {
+    if (text.find('\0') != std::string_view::npos) {
+        throw ConfigurationError("There is a NUL byte in the file");
+    }
 }
 
 } // namespace tessel::authentication
