@@ -26,7 +26,7 @@ become_root() {
 # What every program of this folder needs to build the library and to make a node or a lab of them.
 readonly build_packages=(
     cmake ninja-build g++ pkg-config libboost-dev libssl-dev libcli11-dev nlohmann-json3-dev
-    libdtl-dev libwbclient-dev libc6-dev iproute2 util-linux passwd procps python3
+    libdtl-dev libwbclient-dev libpam0g-dev libc6-dev iproute2 util-linux passwd procps python3
 )
 # What shows that the log-in is real: a PAM and a name-service module, and a client of each library.
 readonly login_packages=(
