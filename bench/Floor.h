@@ -74,7 +74,7 @@ inline File Read(char const* path) {
 }
 
 /// Replaces a file through a temporary one: `write(descriptor)` fills it.
-/// openat (mkstemp), close, openat, ..., fsync, close, stat, chmod, rename, chmod, and for the
+/// openat (mkstemp), close, openat, ..., stat, fchmod, fsync, close, stat, rename, chmod, and for the
 /// folder openat, fsync, close
 template <typename Write> void Replace(std::string const& path, Write write) {
     char name[4096];
@@ -83,14 +83,14 @@ template <typename Write> void Replace(std::string const& path, Write write) {
     ::close(Checked(::mkstemp(name)));
     int const file = Checked(::open(name, O_WRONLY | O_CREAT | O_TRUNC, 0666));
     write(file);
-    Checked(::fsync(file));
-    ::close(file);
     struct stat old = {};
     Checked(::stat(target, &old));
-    mode_t const mode = old.st_mode & 07777;
-    Checked(::chmod(name, mode));
+    Checked(::fchmod(file, old.st_mode & 07777));
+    Checked(::fsync(file));
+    ::close(file);
+    Checked(::stat(target, &old));
     Checked(::rename(name, target));
-    Checked(::chmod(target, mode));
+    Checked(::chmod(target, old.st_mode & 07777));
     name[path.rfind('/') + 1] = '\0';
     int const folder = Checked(::open(name, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     Checked(::fsync(folder));

@@ -3,6 +3,8 @@
 
 #include "Paths.h"
 
+#include <sys/stat.h>
+
 namespace tessel::authentication {
 
 namespace {
@@ -16,6 +18,11 @@ void Close(void* library) {
 
 LibraryHandle LoadProvider(std::string const& name, int flags, char const* failure) {
     std::string const path = Paths::ProviderPrefix + name + Paths::ProviderSuffix;
+    // The loader would wait for who writes to a pipe; a folder it refuses by itself.
+    struct stat status = {};
+    if (stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode)) {
+        throw IOError(failure + path + ": it is not a regular file");
+    }
     // An error that somebody else has left behind must not pass for this library's.
     (void)dlerror();
     LibraryHandle library(dlopen(path.c_str(), flags), &Close);

@@ -8,6 +8,8 @@
 #include <tslauth/systemconfiguration/PAMFacility.h>
 
 #include <stdexcept>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
 
 using namespace tessel::authentication;
 using SystemConfiguration::InvalidControlException;
@@ -556,6 +558,26 @@ TEST_F(ActiveDirectoryStoreTest, DirectoryInThePlaceOfAFileIsAnIOError) {
     EXPECT_EQ("IOError: Cannot read '/etc/pam.d/system-auth-generic': it is not a regular file",
               ActivationFailure());
     ASSERT_EQ(0, rmdir(Paths::PAMPolicy));
+}
+
+TEST_F(ActiveDirectoryStoreTest, PipeOrDeviceInThePlaceOfAFileIsRefusedAndNotWaitedFor) {
+    for (std::string const& path : Host::Files()) {
+        for (mode_t const kind : {mode_t{S_IFIFO}, mode_t{S_IFCHR}}) {
+            std::string const text = Host::Read(path);
+            ASSERT_EQ(0, unlink(path.c_str()));
+            ASSERT_EQ(0, mknod(path.c_str(), kind | 0644U, makedev(1, 5))); // zeros without an end
+            EXPECT_EQ("IOError: Cannot read '" + path + "': it is not a regular file",
+                      ActivationFailure());
+            ASSERT_EQ(0, unlink(path.c_str()));
+            Host::Write(path, text);
+        }
+    }
+    ASSERT_EQ(0, unlink(Paths::ProviderConfiguration));
+    ASSERT_EQ(0, mkfifo(Paths::ProviderConfiguration, 0644));
+    EXPECT_EQ("InvalidActiveDirectoryProviderException: The specified Active Directory provider "
+              "'(none installed)' is invalid",
+              ConstructionFailure());
+    ASSERT_EQ(0, unlink(Paths::ProviderConfiguration));
 }
 
 TEST_F(ActiveDirectoryStoreTest, FolderThatCannotBeWrittenLeavesThePolicyAsItWas) {

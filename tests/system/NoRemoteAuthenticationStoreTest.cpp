@@ -81,6 +81,14 @@ public:
 
 int LocalStore::living = 0;
 
+/// A host's own kind of "None".
+class RenamedNone : public NoRemoteAuthenticationStore {
+public:
+    std::string GetDisplayName() const override {
+        return "Renamed";
+    }
+};
+
 constexpr char None[] = "remote-authentication-store = \"None\"\n";
 
 void Record(std::string const& name) {
@@ -107,6 +115,17 @@ protected:
     AuthenticationStoreFactory _factory;
     NoRemoteAuthenticationStore _none;
 };
+
+TEST_F(NoRemoteAuthenticationStoreTest, RecordsNoneUnderWhateverNameItIsKnown) {
+    RenamedNone renamed;
+    Record("Counted");
+    renamed.MakeActive();
+    EXPECT_EQ(None, Recorded());
+    EXPECT_EQ(1, CountedStore::withdrawn);
+    Record("Renamed");
+    renamed.MakeActive();
+    EXPECT_EQ("remote-authentication-store = \"Renamed\"\n", Recorded()) << "it is active already";
+}
 
 TEST_F(NoRemoteAuthenticationStoreTest, IsNamedNone) {
     EXPECT_EQ("None", _none.GetDisplayName());

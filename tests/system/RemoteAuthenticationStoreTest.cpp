@@ -5,7 +5,30 @@
 #include <tslauth/Exceptions.h>
 #include <tslauth/NoRemoteAuthenticationStore.h>
 
+#include <stdexcept>
+
 using namespace tessel::authentication;
+
+TSLAUTH_AUTO_PTR_BEGIN
+
+namespace {
+
+/// A caller's own store, which cannot tell its name.
+class NamelessStore : public RemoteAuthenticationStore {
+public:
+    std::auto_ptr<StoreConfiguration> GetStoreConfiguration() const override {
+        return std::auto_ptr<StoreConfiguration>();
+    }
+    std::string GetDisplayName() const override {
+        throw std::runtime_error("no name");
+    }
+    void MakeActive() override {}
+    void MakeInactive() override {}
+};
+
+} // namespace
+
+TSLAUTH_AUTO_PTR_END
 
 class RemoteAuthenticationStoreTest : public Host::Test {};
 
@@ -45,6 +68,14 @@ TEST_F(RemoteAuthenticationStoreTest, MalformedLineIsAConfigurationError) {
     EXPECT_THROW(none.IsActive(), ConfigurationError);
     EXPECT_EQ("ConfigurationError: Error parsing configuration on line 3: no delimiter found",
               Host::FailureOf([&] { none.IsActive(); }));
+}
+
+TEST_F(RemoteAuthenticationStoreTest, FileIsReadThenTheNameTakenThenTheKeyLookedUp) {
+    NamelessStore const nameless;
+    Host::Write(Paths::AuthenticationConfiguration, "other = \"None\"\n");
+    EXPECT_EQ("runtime_error: no name", Host::FailureOf([&] { nameless.IsActive(); }));
+    ASSERT_EQ(0, unlink(Paths::AuthenticationConfiguration));
+    EXPECT_THROW(nameless.IsActive(), IOError);
 }
 
 TEST_F(RemoteAuthenticationStoreTest, MissingKeyIsNotAnsweredWithFalse) {

@@ -38,7 +38,8 @@ public:
     /// @param verifyCertificate whether the provider is to verify the server's certificate
     /// @param thumbprint of the certificate that the server is expected to present; empty if it is
     ///     not known
-    /// @throws IOError "Unable to open CAM provider: " + the loader's text, if it cannot be loaded
+    /// @throws IOError "Unable to open CAM provider: " + the loader's text, if it cannot be loaded;
+    ///     also for a pipe or a device, neither of which is waited for
     /// @throws InvalidCAMProxyProviderException with the loader's text, if it lacks its record; it
     ///     has been unloaded again then
     CAMProxy(std::string const& providerName, std::string const& serverAddress,
