@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <array>
+#include <base/Descriptor.h>
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
@@ -19,24 +20,6 @@ namespace {
 
 /// Room for every code of the service, and for white space around it.
 constexpr std::size_t MaximumSize = 256;
-
-class Descriptor {
-public:
-    explicit Descriptor(int number) : _number(number) {}
-    Descriptor(Descriptor const&) = delete;
-    Descriptor& operator=(Descriptor const&) = delete;
-    ~Descriptor() {
-        if (_number >= 0) {
-            (void)close(_number); // what was written has been synced
-        }
-    }
-    int Number() const {
-        return _number;
-    }
-
-private:
-    int const _number;
-};
 
 std::string Text(char const* operation, std::string const& path, int error) {
     return std::string(operation) + " '" + path + "': " + strerror(error);
@@ -58,8 +41,9 @@ OneTimeCode::~OneTimeCode() = default;
 
 SecretText OneTimeCode::Read() const {
     // Without waiting: the path may be a pipe.
-    Descriptor const file(open(_path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
-    if (file.Number() < 0) {
+    base::Descriptor const file(
+        open(_path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+    if (!file) {
         int const error = errno;
         std::string const text = Text("cannot open the one-time code", _path, error);
         if (error == ENOENT) {
@@ -68,7 +52,7 @@ SecretText OneTimeCode::Read() const {
         throw Failure(error == ELOOP ? Codes::CodeNotProtected : Codes::Unknown, text);
     }
     struct stat status = {};
-    if (fstat(file.Number(), &status) != 0) {
+    if (fstat(file.Get(), &status) != 0) {
         throw Failure(Codes::Unknown, Text("cannot look at", _path, errno));
     }
     if (!S_ISREG(status.st_mode) || status.st_uid != geteuid() ||
@@ -81,7 +65,7 @@ SecretText OneTimeCode::Read() const {
     SecretText content(MaximumSize + 1);
     std::size_t size = 0;
     while (size < content.size()) {
-        ssize_t const count = read(file.Number(), content.data() + size, content.size() - size);
+        ssize_t const count = read(file.Get(), content.data() + size, content.size() - size);
         if (count < 0 && errno == EINTR) {
             continue;
         }
@@ -110,14 +94,15 @@ SecretText OneTimeCode::Read() const {
 
 void OneTimeCode::Spend() const {
     {
-        Descriptor const file(open(_path.c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+        base::Descriptor const file(
+            open(_path.c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
         struct stat status = {};
-        if (file.Number() >= 0 && fstat(file.Number(), &status) == 0 && S_ISREG(status.st_mode)) {
+        if (file && fstat(file.Get(), &status) == 0 && S_ISREG(status.st_mode)) {
             std::array<char, MaximumSize> const zeros = {};
             auto const size = std::min<off_t>(status.st_size, MaximumSize);
             // Where it cannot be overwritten it is still removed.
-            (void)!pwrite(file.Number(), zeros.data(), static_cast<std::size_t>(size), 0);
-            (void)fsync(file.Number());
+            (void)!pwrite(file.Get(), zeros.data(), static_cast<std::size_t>(size), 0);
+            (void)fsync(file.Get());
         }
     }
     if (unlink(_path.c_str()) != 0 && errno != ENOENT) {

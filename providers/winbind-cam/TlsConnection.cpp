@@ -14,7 +14,7 @@
 #include <openssl/evp.h>
 #include <openssl/x509.h>
 #include <openssl/x509_vfy.h>
-#include <unistd.h>
+#include <sys/stat.h>
 
 namespace tessel::winbind::cam {
 
@@ -45,7 +45,11 @@ std::string Thumbprint(X509 const* certificate) {
 
 void UseAuthorities(SSL_CTX* context, std::string const& file) {
     // An authority of one's own replaces the system's: nobody else's may then vouch for the service.
-    bool const hasFile = !file.empty() && access(file.c_str(), F_OK) == 0;
+    struct stat status = {};
+    bool const hasFile = !file.empty() && stat(file.c_str(), &status) == 0;
+    if (hasFile && !S_ISREG(status.st_mode)) { // a pipe would be waited for
+        throw Failure(Codes::InvalidCertificate, "'" + file + "' is not a regular file");
+    }
     if ((hasFile ? SSL_CTX_load_verify_locations(context, file.c_str(), nullptr)
                  : SSL_CTX_set_default_verify_paths(context)) != 1) {
         throw Failure(Codes::InvalidCertificate,

@@ -5,6 +5,8 @@
 #include "Paths.h"
 #include "Protocol.h"
 #include "TlsConnection.h"
+#include "join/DomainJoin.h"
+#include "samba/ThisHost.h"
 
 #include <tslauth/tslauth_cam_provider.h>
 
@@ -67,6 +69,9 @@ void CreateAccount(char const* server, Trust const& trust, char const* accountNa
                           " and certificates are not verified: it gets no one-time code");
     }
     std::string const request = AccountRequest(accountName, organisationalUnit);
+    // The provider `winbind` would refuse later, with the code spent and the account made anew: that
+    // of a host that is joined would be broken by it.
+    DomainJoin::RequireJoinable(ThisHost());
     OneTimeCode const code(Paths::OneTimeCode);
     SecretText const text = code.Read();
     SecretText const answer = Ask(server, trust, AccountLimit, {request, View(text), "\n"});

@@ -116,6 +116,17 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
         {__NR_unlink, "unlink"},
 #endif
         {__NR_unlinkat, "unlink"},
+#ifdef __NR_link
+        {__NR_link, "link"},
+#endif
+        {__NR_linkat, "link"},
+#ifdef __NR_mkdir
+        {__NR_mkdir, "mkdir"},
+#endif
+        {__NR_mkdirat, "mkdir"},
+#ifdef __NR_rmdir
+        {__NR_rmdir, "rmdir"},
+#endif
         {__NR_close, "close"},
     };
     return calls;

@@ -173,6 +173,24 @@ protected:
         fs::create_directories("/etc/tessel/tslauth");
         WriteText(StandIn + "/accounts", "");
         WriteText(_folder / "credentials", "username = joiner\npassword = secret\n", 0600);
+        InstallSamba();
+    }
+
+    /// What a host that is to be joined has of Samba; here it is looked for, and hardly asked.
+    static void InstallSamba() {
+        fs::create_directories("/etc/samba");
+        fs::remove("/etc/samba/smb.conf");
+        WriteText("/usr/sbin/winbindd", "#!/bin/sh\nexit 1\n", 0755);
+        WriteText("/usr/bin/net", "#!/bin/sh\nexit 1\n", 0755);
+        std::string folders;
+        for (std::string const name : {"cache directory", "lock directory", "pid directory",
+                                       "private dir", "state directory"}) {
+            folders += "\t" + name + " = /var/lib/samba\n";
+        }
+        WriteText("/usr/bin/testparm",
+                  "#!/bin/sh\ncat <<'EOF'\n[global]\n" + folders +
+                      "\tsecurity = AUTO\n\tserver role = ROLE_STANDALONE\nEOF\n",
+                  0755);
     }
 
     // --- certificates ---
@@ -420,6 +438,14 @@ TEST_F(WinbindCAMTest, AuthoritiesThatCannotBeReadAreNotIgnored) {
     EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", Server, true, "")), IsRefusedCertificate);
 }
 
+TEST_F(WinbindCAMTest, APipeInThePlaceOfTheAuthoritiesIsNotWaitedFor) {
+    auto const service = Serve();
+    fs::remove(AuthoritiesFile);
+    ASSERT_EQ(0, mkfifo(AuthoritiesFile.c_str(), 0644));
+    EXPECT_THAT(NameFailure(CAMProxy("winbind-cam", Server, true, "")), IsRefusedCertificate);
+    fs::remove(AuthoritiesFile);
+}
+
 TEST_F(WinbindCAMTest, AServerThatIsNotThere) {
     EXPECT_THAT(NameFailure(Pinned()), FailsWith(1225, "ConnectionRefusedException"));
     // The node's network is a loopback interface.
@@ -486,6 +512,28 @@ TEST_F(WinbindCAMTest, AHostWithoutACodeIsToldSo) {
     WriteText(CodeFile, "no code", 0600);
     EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(87));
     EXPECT_THAT(service->Log(), Not(HasSubstr("host01")));
+}
+
+TEST_F(WinbindCAMTest, AHostThatCannotBeJoinedKeepsItsCode) {
+    auto const service = Serve();
+    GiveCode("--host host01");
+    std::string const code = Contents(CodeFile);
+
+    fs::remove("/usr/sbin/winbindd");
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(1060));
+    InstallSamba();
+
+    WriteText("/etc/samba/smb.conf", "[global]\n\tinclude = /etc/samba/tslauth.conf\n", 0644);
+    WriteText("/etc/samba/tslauth.conf",
+              "[global]\n\tworkgroup = CORP\n\trealm = CORP.EXAMPLE\n\tnetbios name = HOST01\n",
+              0644);
+    EXPECT_THAT(AccountFailure(Pinned()), IsUnknown(2691));
+    fs::remove("/etc/samba/tslauth.conf");
+
+    EXPECT_EQ(code, Contents(CodeFile));
+    EXPECT_THAT(Calls(), IsEmpty());
+    EXPECT_THAT(service->Log(), Not(HasSubstr("host01")));
+    EXPECT_EQ(BlobOf("host01"), Pinned().CreateMachineAccount("host01", "").firstResult);
 }
 
 TEST_F(WinbindCAMTest, ACodeThatIsNotThisHostsIsRefused) {

@@ -3,6 +3,7 @@
 // what it asks may hang.
 #include "modules/AccountBounds.h"
 #include "questions/AccountCheck.h"
+#include "samba/ThisHost.h"
 
 #include <chrono>
 #include <cstdio>
@@ -23,7 +24,7 @@ int main(int count, char** arguments) {
         return EXIT_FAILURE;
     }
     AccountAnswer const answer =
-        AskAboutAccount(arguments[1], BoundedCall::Clock::now() + AccountBounds::Question);
+        AskAboutAccount(ThisHost(), arguments[1], Clock::now() + AccountBounds::Question);
     std::string const line = std::string(WordOf(answer)) + '\n';
     (void)std::fputs(line.c_str(), stdout); // the flush tells
     return std::fflush(stdout) == 0 ? EXIT_SUCCESS : EXIT_FAILURE;

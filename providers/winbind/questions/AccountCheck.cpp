@@ -2,6 +2,7 @@
 #include "questions/AccountCheck.h"
 
 #include "Failure.h"
+#include "host/Host.h"
 #include "host/Membership.h"
 #include "host/SystemLog.h"
 #include "samba/WinbindClient.h"
@@ -47,15 +48,14 @@ bool NamesADomain(std::string const& user) {
     return user.find_first_of("\\@") != std::string::npos;
 }
 
-AccountAnswer AskDirectory(WinbindClient const& client, SambaDomain const& own,
-                           WinbindClient::Account const& account,
-                           BoundedCall::Clock::time_point deadline) {
+AccountAnswer AskDirectory(Host const& host, WinbindClient const& client, SambaDomain const& own,
+                           WinbindClient::Account const& account, Clock::time_point deadline) {
     // winbindd prints the domain's name in capitals, whatever the join was told.
     std::string const controller = account.domain == own.workgroup
                                        ? std::string()
                                        : client.FindDomainController(account.domain, "");
     std::vector<DirectoryEntry> const entries =
-        SearchDirectory(controller, "(objectSid=" + account.identifier + ")",
+        SearchDirectory(host, controller, "(objectSid=" + account.identifier + ")",
                         {control, computed, expiry}, deadline);
     if (entries.size() != 1) {
         throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER,
@@ -64,14 +64,14 @@ AccountAnswer AskDirectory(WinbindClient const& client, SambaDomain const& own,
     return StateOfAccount(entries.front(), std::chrono::system_clock::now());
 }
 
-AccountAnswer Ask(std::string const& user, BoundedCall::Clock::time_point deadline) {
-    auto const membership = Membership::Read();
+AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point deadline) {
+    auto const membership = Membership::Read(host);
     if (!membership) {
         return AccountAnswer::NotOfTheDomain;
     }
     WinbindClient const client(deadline);
     try {
-        return AskDirectory(client, membership->domain, client.GetAccount(user), deadline);
+        return AskDirectory(host, client, membership->domain, client.GetAccount(user), deadline);
     } catch (Failure const& failure) {
         if (failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_USER && !NamesADomain(user)) {
             return AccountAnswer::NotOfTheDomain;
@@ -102,9 +102,10 @@ AccountAnswer StateOfAccount(DirectoryEntry const& entry,
     return AccountAnswer::InOrder;
 }
 
-AccountAnswer AskAboutAccount(std::string const& user, BoundedCall::Clock::time_point deadline) {
+AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
+                              Clock::time_point deadline) {
     try {
-        return Ask(user, deadline);
+        return Ask(host, user, deadline);
     } catch (std::exception const& failure) {
         LogWarning("may '" + user + "' log in: " + failure.what());
         return AccountAnswer::NoAnswer;

@@ -11,6 +11,8 @@
 /// is none of a controller's business, unless somebody asks.
 namespace tessel::winbind {
 
+class Host;
+
 /// What an account's attributes say. An account whose state the host may not read is `NoAnswer`.
 /// @param entry `userAccountControl`, `msDS-User-Account-Control-Computed` and `accountExpires`, as
 ///     the directory has them (MS-ADTS 2.2.16, 3.1.1.4.5.17, MS-ADA1 2.2)
@@ -21,6 +23,7 @@ AccountAnswer StateOfAccount(DirectoryEntry const& entry,
 /// Asks winbindd who `user` is, a name in any form that the name service takes, and a controller of
 /// his domain for his account. Needs root. Blocks until `deadline` at the latest; every failure is
 /// `NoAnswer`, with its cause in the system log.
-AccountAnswer AskAboutAccount(std::string const& user, BoundedCall::Clock::time_point deadline);
+AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
+                              Clock::time_point deadline);
 
 } // namespace tessel::winbind
