@@ -19,6 +19,7 @@
 #include <thread>
 #include <unistd.h>
 #include <vector>
+#include <wbclient.h>
 
 /// libwbclient takes the socket's folder from the environment in a program that exports the first of
 /// these, and a folder that is not root's in one that exports the second: the wrappers of Samba's own
@@ -33,7 +34,14 @@ public:
     /// bytes are sent. Nothing closes the connection.
     typedef std::function<std::string(std::uint32_t command)> Script;
 
+    // The protocol is nobody's but Samba's, whose numbers change with it.
+#if WBCLIENT_MINOR_VERSION >= 16
+    enum Command : std::uint32_t { InterfaceVersion = 0, PrivilegedFolder = 43 };
+    static constexpr std::uint32_t Protocol = 33;
+#else
     enum Command : std::uint32_t { InterfaceVersion = 0, PrivilegedFolder = 44 };
+    static constexpr std::uint32_t Protocol = 32;
+#endif
     enum Result : std::uint32_t { Error = 0, Ok = 2 };
 
     static std::string Silence() {
@@ -56,7 +64,7 @@ public:
         return [answer](std::uint32_t command) {
             switch (command) {
             case InterfaceVersion:
-                return Answer(Ok, 32);
+                return Answer(Ok, Protocol);
             case PrivilegedFolder:
                 return Answer(Ok, 0, std::string(getenv("SELFTEST_WINBINDD_SOCKET_DIR")) + '\0');
             default: // any question
