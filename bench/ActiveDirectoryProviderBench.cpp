@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Cases.h"
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 #include <tslauth/ActiveDirectoryProvider.h>
 #include <tslauth/Exceptions.h>

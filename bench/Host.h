@@ -3,7 +3,7 @@
 #define BENCH_HOST_H
 
 #include "Files.h"
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 namespace bench::Host {
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Host.h"
+#include "analysis/Failures.h"
 #include "verbs/Verbs.h"
 
 #if defined(__GNUC__)
@@ -210,7 +210,7 @@ private:
             [&](Console& console) { return RunPreferredDCs(arguments.limit, console); });
         preferred->require_subcommand(0, 1);
         auto const set = [&](Console& console) {
-            return RunSetPreferredDCs(arguments.names, arguments.limit, console);
+            return RunSetPreferredDCs(arguments.names, console);
         };
         AddAsking(*preferred, "set", "Set them, in this order", arguments, set)
             ->add_option("names", arguments.names, "Names of domain controllers")

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <string>
 #include <string_view>
+#include <vector>
 
 /// Bytes of files and answers. ASCII alone, and never the locale of the process: in a Turkish one
 /// "CORP.INTERNAL" would not be "corp.internal".
@@ -18,6 +19,10 @@ constexpr bool IsDigit(char c) {
 
 constexpr bool IsLetter(char c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
+
+constexpr bool IsSpace(char c) {
+    return c == ' ' || (c >= '\t' && c <= '\r');
 }
 
 constexpr bool IsControl(char c) {
@@ -61,6 +66,11 @@ inline bool HasControlCharacters(std::string_view text) {
     return std::any_of(text.begin(), text.end(), [](char c) { return IsControl(c); });
 }
 
+/// Whether nothing but white space is there.
+inline bool IsBlank(std::string_view text) {
+    return text.find_first_not_of(WhiteSpace) == std::string_view::npos;
+}
+
 inline std::string_view TrimmedRight(std::string_view text) {
     return text.substr(0, text.find_last_not_of(WhiteSpace) + 1);
 }
@@ -80,6 +90,15 @@ inline std::string_view TakeLine(std::string_view& text) {
     return line;
 }
 
+/// The lines of a text, each with its line feed; the last one may lack it.
+inline std::vector<std::string_view> Lines(std::string_view text) {
+    std::vector<std::string_view> lines;
+    while (!text.empty()) {
+        lines.push_back(TakeLine(text));
+    }
+    return lines;
+}
+
 /// Takes the first word off a text, with the `blanks` in front of it. Empty where there is none.
 inline std::string_view TakeWord(std::string_view& text, std::string_view blanks = WhiteSpace) {
     text.remove_prefix(std::min(text.find_first_not_of(blanks), text.size()));
@@ -91,6 +110,16 @@ inline std::string_view TakeWord(std::string_view& text, std::string_view blanks
 /// How the lines of a text that something adds lines to end.
 inline std::string_view LineEnd(std::string_view text) {
     return text.find("\r\n") == std::string_view::npos ? "\n" : "\r\n";
+}
+
+/// "1 line", "2 lines"
+inline std::string Counted(std::size_t count, std::string_view noun) {
+    std::string text = std::to_string(count) + " ";
+    text += noun;
+    if (count != 1) {
+        text += 's';
+    }
+    return text;
 }
 
 } // namespace tessel::base::AsciiText

@@ -2,12 +2,8 @@
 #include <tslauth/ActiveDirectoryStore.h>
 
 #include "MutexLock.h"
-#include "Paths.h"
-#include "ProviderModules.h"
-#include "SystemFile.h"
-#include "ThrowMappedException.h"
+#include "WorkerFailure.h"
 
-#include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
 #include <tslauth/ProviderConfiguration.h>
 #include <tslauth/TslauthThreadUtil.h>
@@ -26,30 +22,6 @@ namespace {
 
 /// The trust state of a host whose provider finds nothing to read the trusted domains from.
 constexpr int TrustStateFileNotFound = 7;
-
-std::string ConfiguredProvider() {
-    try {
-        ProviderConfiguration const configuration;
-        auto const provider = configuration.find(Paths::ProviderKey);
-        if (provider == configuration.end() || provider->second.empty()) {
-            throw InvalidActiveDirectoryProviderException("(unset)");
-        }
-        return provider->second;
-    } catch (IOError const&) {
-        throw InvalidActiveDirectoryProviderException("(none installed)");
-    }
-}
-
-/// Brings the PAM policy and then the name-service switch into the state that `edit` asks for.
-void EditSystemFiles(ProviderModules::Edit edit, SystemConfiguration::PAMEntry const& entry,
-                     ActiveDirectoryProvider const& provider) {
-    using namespace ProviderModules;
-    ReplaceFile(Paths::PAMPolicy, EditedPAMPolicy(ReadFile(Paths::PAMPolicy), edit, entry));
-    ReplaceFile(Paths::NSSConfiguration,
-                EditedNSSConfiguration(
-                    ReadFile(Paths::NSSConfiguration), edit,
-                    NSSServiceFor(provider.NSSModule(), provider.NSSModuleParameters())));
-}
 
 /// The provider's answer, or `neutral` where it does not offer the call.
 template <typename Answer, typename Call> Answer AnswerOr(Answer neutral, Call call) {
@@ -108,12 +80,6 @@ Answer AskTimed(TimedQuestion<Answer> const& question, pthread_mutex_t& mutex, i
     return *cache;
 }
 
-/// What a worker reports that ended with none of the library's own failures. Made when the library
-/// is loaded, because the failure may be that there is no memory, and never destroyed, because a
-/// worker may still run when the process ends. 1359 is ERROR_INTERNAL_ERROR.
-Exception const& internalError = *new InternalErrorException(
-    TSLAUTH_PROVIDER_INTERNAL_ERROR, FindMappedException(TSLAUTH_PROVIDER_INTERNAL_ERROR).text);
-
 /// The work of a worker: asks, stores the answer in `cache`, clears `active` and reports the end.
 /// A failure leaves the cache as it was. One of the library's own family reaches the waiter as it
 /// is; any other would end the host's process if it left the thread, and becomes an internal error.
@@ -134,7 +100,7 @@ void AnswerInWorker(pthread_mutex_t& mutex, bool& active, RequestState& state, A
         state.Done(&failure);
     } catch (...) {
         Clear(mutex, active);
-        state.Done(&internalError);
+        state.Done(&WorkerFailure);
     }
 }
 
@@ -204,21 +170,29 @@ std::string ActiveDirectoryStore::GetDisplayName() const {
 }
 
 SystemConfiguration::PAMEntry ActiveDirectoryStore::GetPAMEntryForProvider() const {
-    return ProviderModules::PAMEntryFor(_provider->PAMModule(), _provider->PAMModuleParameters());
+    return MakeProviderEntries(*_provider).pam;
 }
 
 void ActiveDirectoryStore::MakeActive() {
-    // Read, and the key found, before anything is written: a host whose record cannot be kept is
-    // left alone.
-    AuthenticationConfiguration configuration;
-    std::string& recorded = configuration[Paths::RemoteAuthenticationStoreKey];
-    EditSystemFiles(ProviderModules::Edit::insert, GetPAMEntryForProvider(), *_provider);
-    recorded = GetDisplayName();
-    configuration.Write();
+    GetActivationPlan().Execute();
 }
 
 void ActiveDirectoryStore::MakeInactive() {
-    EditSystemFiles(ProviderModules::Edit::remove, GetPAMEntryForProvider(), *_provider);
+    GetWithdrawalPlan().Execute();
+}
+
+ActivationPlan ActiveDirectoryStore::GetActivationPlan(EditForm form) const {
+    return ActivationPlan::Activating(GetProviderEntries(), GetDisplayName(), form);
+}
+
+ActivationPlan ActiveDirectoryStore::GetWithdrawalPlan(EditForm form) const {
+    return ActivationPlan::Withdrawing(GetProviderEntries(), form);
+}
+
+ProviderEntries ActiveDirectoryStore::GetProviderEntries() const {
+    auto entries = MakeProviderEntries(*_provider);
+    entries.pam = GetPAMEntryForProvider();
+    return entries;
 }
 
 std::auto_ptr<StoreConfiguration> ActiveDirectoryStore::GetStoreConfiguration() const {
@@ -303,7 +277,7 @@ void ActiveDirectoryStore::GetStoreConfigurationInt(
     } catch (...) {
         // Not even an empty answer could be made.
         Clear(_lock, _isGetStoreConfigThreadActive);
-        state->Done(&internalError);
+        state->Done(&WorkerFailure);
     }
 }
 

@@ -3,7 +3,7 @@
 
 #include "CertificateThumbprint.h"
 #include "HostName.h"
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 #include <tslauth/CAMProviderConfiguration.h>
 #include <tslauth/CAMProxy.h>

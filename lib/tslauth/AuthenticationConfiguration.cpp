@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/AuthenticationConfiguration.h>
 
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 namespace tessel::authentication {
 
@@ -9,5 +9,10 @@ AuthenticationConfiguration::AuthenticationConfiguration()
     : Configuration(Paths::AuthenticationConfiguration) {}
 
 AuthenticationConfiguration::~AuthenticationConfiguration() = default;
+
+std::string RecordedStore() {
+    AuthenticationConfiguration const configuration;
+    return configuration[Paths::RemoteAuthenticationStoreKey];
+}
 
 } // namespace tessel::authentication

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/CAMProviderConfiguration.h>
 
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 namespace tessel::authentication {
 

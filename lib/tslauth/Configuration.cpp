@@ -9,15 +9,6 @@
 
 namespace tessel::authentication {
 
-namespace {
-
-void ThrowMissing(std::string const& key) {
-    throw InvalidKeyException("The specified key '" + key +
-                              "' was not found in this configuration");
-}
-
-} // namespace
-
 Configuration::Configuration(std::string const& path)
     : Configuration(path, OnReadError::EndQuietly) {}
 
@@ -48,7 +39,7 @@ void Configuration::Write() const {
 std::string& Configuration::operator[](std::string const& key) {
     iterator const found = find(key);
     if (found == end()) {
-        ThrowMissing(key);
+        ThrowMissingKey(key);
     }
     return found->second;
 }
@@ -56,7 +47,7 @@ std::string& Configuration::operator[](std::string const& key) {
 std::string const& Configuration::operator[](std::string const& key) const {
     const_iterator const found = find(key);
     if (found == end()) {
-        ThrowMissing(key);
+        ThrowMissingKey(key);
     }
     return found->second;
 }

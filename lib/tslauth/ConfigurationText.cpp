@@ -44,6 +44,11 @@ void ReadAssignments(std::string_view text, std::map<std::string, std::string>& 
     }
 }
 
+void ThrowMissingKey(std::string const& key) {
+    throw InvalidKeyException("The specified key '" + key +
+                              "' was not found in this configuration");
+}
+
 void AssignLine(std::string& line, Assignment const& assignment) {
     static constexpr std::string_view middle = " = \"";
     static constexpr std::string_view end = "\"\n";

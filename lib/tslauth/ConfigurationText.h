@@ -18,6 +18,9 @@ base::Assignment SplitLine(std::string_view line, int lineNumber);
 /// @throws ConfigurationError at the first bad line
 void ReadAssignments(std::string_view text, std::map<std::string, std::string>& map);
 
+/// @throws InvalidKeyException, always
+[[noreturn]] void ThrowMissingKey(std::string const& key);
+
 /// Makes `line` the line of an assignment. Its length is known first, because growing it piece by
 /// piece takes longer than everything else that a line costs besides its system call.
 void AssignLine(std::string& line, base::Assignment const& assignment);

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "ProviderLibrary.h"
 
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 #include <sys/stat.h>
 

@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "ProviderModules.h"
 
-#include "Paths.h"
 #include "systemconfiguration/NSSConfigurationText.h"
 #include "systemconfiguration/PAMPolicyText.h"
+#include <tslauth/Paths.h>
 
 #include <algorithm>
+#include <sstream>
 #include <string>
 
 namespace tessel::authentication::ProviderModules {
@@ -17,6 +18,12 @@ namespace {
 /// Room for what normalising and the edit add, so that the printed text is rarely moved.
 std::size_t RoomFor(std::string_view text) {
     return text.size() + text.size() / 8 + 256;
+}
+
+template <typename Value> std::string Printed(Value const& value) {
+    std::ostringstream text;
+    text << value;
+    return text.str();
 }
 
 template <typename Queue, typename Item> bool Contains(Queue const& queue, Item const& item) {
@@ -42,6 +49,14 @@ NSSService NSSServiceFor(std::string const& module, std::list<std::string> const
     NSSService service(module);
     service.parameters() = parameters;
     return service;
+}
+
+meaning::PAMLine Meaning(PAMEntry const& entry, std::string const& facility) {
+    return meaning::ReadPAMEntry(facility, Printed(entry));
+}
+
+meaning::NSSServices Meaning(NSSService const& service) {
+    return meaning::ReadNSSServices(Printed(service));
 }
 
 void Apply(Edit edit, PAMEntry const& entry, PAMPolicy& policy) {

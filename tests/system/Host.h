@@ -3,7 +3,7 @@
 #define TESTS_SYSTEM_HOST_H
 
 #include "Node.h"
-#include "Paths.h"
+#include <tslauth/Paths.h>
 
 #include <tslauth/Exception.h>
 

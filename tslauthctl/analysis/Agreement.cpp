@@ -1,14 +1,32 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Agreement.h"
 
+#include <meaning/NSSMeaning.h>
+#include <meaning/PAMMeaning.h>
+
 #include <algorithm>
+#include <sstream>
 
 namespace tessel::tslauthctl {
 
 namespace {
 
-constexpr char const* facilities[] = {"auth", "account"};
-constexpr char const* databases[] = {"passwd", "group", "shadow"};
+using namespace authentication;
+using namespace meaning;
+
+template <typename Value> std::string Printed(Value const& value) {
+    std::ostringstream text;
+    text << value;
+    return text.str();
+}
+
+std::vector<Part> UnknownParts(std::vector<std::string> const& names) {
+    std::vector<Part> parts;
+    for (auto const& name : names) {
+        parts.push_back({name, Agreement::unknown});
+    }
+    return parts;
+}
 
 Part MakePart(std::string const& name, bool present, bool wanted) {
     return {name, present == wanted ? Agreement::inStep : Agreement::notAtAll};
@@ -34,10 +52,10 @@ std::vector<Part> PAMParts(std::string_view text, SystemConfiguration::PAMEntry 
                            bool wanted) {
     auto const meaning = ReadPAMMeaning(text);
     std::vector<Part> parts;
-    for (auto const* facility : facilities) {
+    for (auto const& facility : EditedFacilities()) {
         auto const stack = PAMStackOf(meaning, facility);
-        bool const present =
-            std::find(stack.begin(), stack.end(), Meaning(entry, facility)) != stack.end();
+        auto const sought = ReadPAMEntry(facility, Printed(entry));
+        bool const present = std::find(stack.begin(), stack.end(), sought) != stack.end();
         parts.push_back(MakePart(facility, present, wanted));
     }
     return parts;
@@ -46,9 +64,9 @@ std::vector<Part> PAMParts(std::string_view text, SystemConfiguration::PAMEntry 
 std::vector<Part> NSSParts(std::string_view text, SystemConfiguration::NSSService const& service,
                            bool wanted) {
     auto const meaning = ReadNSSMeaning(text);
-    auto const sought = Meaning(service);
+    auto const sought = ReadNSSServices(Printed(service));
     std::vector<Part> parts;
-    for (auto const* database : databases) {
+    for (auto const& database : EditedDatabases()) {
         auto const services = EffectiveNSSServices(meaning, database).value_or(NSSServices());
         bool const present =
             !sought.empty() && std::search(services.begin(), services.end(), sought.begin(),
@@ -59,19 +77,11 @@ std::vector<Part> NSSParts(std::string_view text, SystemConfiguration::NSSServic
 }
 
 std::vector<Part> UnknownPAMParts() {
-    std::vector<Part> parts;
-    for (auto const* facility : facilities) {
-        parts.push_back({facility, Agreement::unknown});
-    }
-    return parts;
+    return UnknownParts(EditedFacilities());
 }
 
 std::vector<Part> UnknownNSSParts() {
-    std::vector<Part> parts;
-    for (auto const* database : databases) {
-        parts.push_back({database, Agreement::unknown});
-    }
-    return parts;
+    return UnknownParts(EditedDatabases());
 }
 
 Agreement Together(std::vector<Part> const& parts) {

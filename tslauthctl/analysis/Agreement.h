@@ -2,7 +2,7 @@
 #ifndef TSLAUTHCTL_AGREEMENT_H
 #define TSLAUTHCTL_AGREEMENT_H
 
-#include "analysis/Loss.h"
+#include <tslauth/ActivationPlan.h>
 
 #include <string>
 #include <string_view>

@@ -4,7 +4,11 @@
 #include <tslauth/Exceptions.h>
 
 #include <algorithm>
+#include <cstdlib>
+#include <cxxabi.h>
 #include <iterator>
+#include <memory>
+#include <typeinfo>
 
 namespace tessel::tslauthctl {
 
@@ -52,6 +56,17 @@ constexpr Row table[] = {
 };
 
 } // namespace
+
+std::string ClassName(std::exception const& exception) {
+    int status = 0;
+    std::unique_ptr<char, decltype(&std::free)> const name(
+        abi::__cxa_demangle(typeid(exception).name(), nullptr, nullptr, &status), &std::free);
+    return status == 0 ? name.get() : typeid(exception).name();
+}
+
+Failure Refused(std::exception const& exception) {
+    return {ExitCode::refused, exception.what(), ClassName(exception)};
+}
 
 ExitCode ExitCodeOf(std::exception const& exception, Account account) {
     auto const* const row = std::find_if(std::begin(table), std::end(table), [&](Row const& each) {

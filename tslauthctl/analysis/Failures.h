@@ -2,13 +2,18 @@
 #ifndef TSLAUTHCTL_FAILURES_H
 #define TSLAUTHCTL_FAILURES_H
 
-#include "analysis/Loss.h"
 #include "terminal/Console.h"
 
 #include <exception>
 #include <new>
 
 namespace tessel::tslauthctl {
+
+/// The class of an exception, with its namespaces.
+std::string ClassName(std::exception const& exception);
+
+/// The library's refusal, as a failure of the command.
+Failure Refused(std::exception const& exception);
 
 /// Whether the call was made in somebody's name. "Access denied" is about that name then, and about
 /// the host or the one asked for otherwise.

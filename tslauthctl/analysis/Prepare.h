@@ -2,8 +2,10 @@
 #ifndef TSLAUTHCTL_PREPARE_H
 #define TSLAUTHCTL_PREPARE_H
 
-#include "analysis/Loss.h"
+#include <tslauth/ActivationPlan.h>
 
+#include <functional>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -12,6 +14,12 @@
 /// second one, and back again. Lines that it carries as they are stay byte for byte. No file is
 /// opened here.
 namespace tessel::tslauthctl {
+
+using authentication::ProviderEntries;
+
+/// Gives a file of the host by its path, for the policies that a policy includes; nothing where it
+/// cannot be read.
+using HostFiles = std::function<std::optional<std::string>(std::string const&)>;
 
 struct PreparedLine {
     /// From 1; 0 where the finding belongs to the file as a whole.
@@ -34,8 +42,8 @@ struct Prepared {
 /// @param acceptLoss also edit lines that cannot keep their meaning, where the library can carry
 ///        the rest of them; what is lost stands in `impossible` all the same
 Prepared PrepareNSS(std::string_view text, ProviderEntries const& provider, bool acceptLoss);
-Prepared PreparePAM(std::string_view text, ProviderEntries const& provider,
-                    PAMPolicyReader const& reader, bool acceptLoss);
+Prepared PreparePAM(std::string_view text, ProviderEntries const& provider, HostFiles const& files,
+                    bool acceptLoss);
 
 /// Entries of no provider in particular, for a host without one.
 ProviderEntries PlaceholderEntries();

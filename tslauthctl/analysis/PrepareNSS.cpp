@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Prepare.h"
 
-#include "terminal/Text.h"
-
+#include <tslauth/Paths.h>
 #include <tslauth/systemconfiguration/NSSDatabase.h>
+
+#include <base/AsciiText.h>
+#include <meaning/NSSMeaning.h>
 
 #include <algorithm>
 
@@ -11,15 +13,15 @@ namespace tessel::tslauthctl {
 
 namespace {
 
-using authentication::ProviderModules::EditedNSSConfiguration;
+using namespace authentication;
+using namespace base::AsciiText;
+using namespace meaning;
 
-/// The databases that the library puts its service into. A file without one of these lines gets a
-/// line that names the provider alone.
-constexpr std::string_view editedDatabases[] = {"passwd", "group", "shadow"};
-
-bool IsEdited(std::string_view database) {
-    return std::find(std::begin(editedDatabases), std::end(editedDatabases), database) !=
-           std::end(editedDatabases);
+/// Whether the library puts its service into a database. A file without a line for such a one gets
+/// a line that names the provider alone.
+bool IsEdited(std::string const& database) {
+    auto const edited = EditedDatabases();
+    return std::find(edited.begin(), edited.end(), database) != edited.end();
 }
 
 /// Whether the last of several lines for a database is known to be the one that applies.
@@ -46,11 +48,9 @@ bool Carries(std::string const& text, ProviderEntries const& provider,
              std::vector<std::string>* losses = nullptr) {
     std::vector<std::string> found;
     try {
-        auto const activated = EditedNSSConfiguration(text, Edit::insert, provider.nss);
-        found = NSSLosses(text, activated, Edit::insert, provider.nss);
-        if (found.empty()) {
-            found = NSSLossesOnReturn(activated, provider.nss);
-        }
+        found = ActivationPlan::Activating(provider, {})
+                    .PreviewOf(Paths::NSSConfiguration, [&](std::string const&) { return text; })
+                    .losses;
     } catch (std::exception const& e) {
         found.emplace_back(e.what());
     }
@@ -64,7 +64,7 @@ bool Carries(std::string const& text, ProviderEntries const& provider,
 bool CarriesLine(std::string const& line, std::string const& database,
                  ProviderEntries const& provider) {
     std::string text;
-    for (auto const edited : editedDatabases) {
+    for (auto const& edited : EditedDatabases()) {
         if (edited != database) {
             text += edited;
             text += ": files\n";
@@ -300,8 +300,7 @@ private:
 
     /// Where a database that the library edits has no line, the line that it is taken to have.
     void AddMissing() {
-        for (auto const database : editedDatabases) {
-            auto const name = std::string(database);
+        for (auto const& name : EditedDatabases()) {
             auto const usual = DefaultNSSServices(name);
             if (_meaning.databases.count(name) != 0 || !usual) {
                 continue;
@@ -336,8 +335,7 @@ Prepared PrepareNSS(std::string_view text, ProviderEntries const& provider, bool
 }
 
 ProviderEntries PlaceholderEntries() {
-    using namespace authentication::ProviderModules;
-    return {PAMEntryFor("pam_provider.so", {}), NSSServiceFor("provider", {})};
+    return MakeProviderEntries("pam_provider.so", {}, "provider", {});
 }
 
 } // namespace tessel::tslauthctl

@@ -1,7 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Prepare.h"
 
-#include "terminal/Text.h"
+#include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
+
+#include <base/AsciiText.h>
+#include <meaning/PAMMeaning.h>
 
 #include <algorithm>
 #include <set>
@@ -10,7 +14,9 @@ namespace tessel::tslauthctl {
 
 namespace {
 
-using authentication::ProviderModules::EditedPAMPolicy;
+using namespace authentication;
+using namespace base::AsciiText;
+using namespace meaning;
 
 constexpr int deepestInclude = 16;
 
@@ -20,18 +26,23 @@ constexpr char before[] = "auth\trequired\tbefore_it.so\naccount\trequired\tbefo
 constexpr char behind[] = "session\toptional\tbehind_it.so\n";
 
 std::vector<std::string> RoundTripLosses(std::string const& text, ProviderEntries const& provider,
-                                         PAMPolicyReader const& reader) {
+                                         HostFiles const& files) {
+    auto const read = [&](std::string const& path) {
+        auto found = path == Paths::PAMPolicy ? std::optional<std::string>(text) : files(path);
+        if (!found) {
+            throw IOError("Cannot open '" + path + "'");
+        }
+        return std::move(*found);
+    };
     try {
-        auto const activated = EditedPAMPolicy(text, Edit::insert, provider.pam);
-        auto losses = PAMLosses(text, activated, Edit::insert, provider.pam, reader);
-        return losses.empty() ? PAMLossesOnReturn(activated, provider.pam, reader) : losses;
+        return ActivationPlan::Activating(provider, {}).PreviewOf(Paths::PAMPolicy, read).losses;
     } catch (std::exception const& e) {
         return {e.what()};
     }
 }
 
 /// Jumps are left out: where they land shows only in the whole file.
-std::optional<std::string> Nothing(std::string const&) {
+std::optional<std::string> Nothing(std::string const& /*path*/) {
     return std::string();
 }
 
@@ -73,10 +84,10 @@ bool FacilitiesOf(std::string const& policy, PAMPolicyReader const& reader, int 
 
 class PAMPreparation {
 public:
-    PAMPreparation(std::string_view text, ProviderEntries const& provider,
-                   PAMPolicyReader const& reader, bool acceptLoss)
-        : _provider(provider), _reader(reader), _acceptLoss(acceptLoss), _lines(Lines(text)),
-          _meaning(ReadPAMMeaning(text)) {
+    PAMPreparation(std::string_view text, ProviderEntries const& provider, HostFiles const& files,
+                   bool acceptLoss)
+        : _provider(provider), _files(files), _reader(PAMPoliciesIn(files)),
+          _acceptLoss(acceptLoss), _lines(Lines(text)), _meaning(ReadPAMMeaning(text)) {
         auto const& entries = _meaning.lines;
         std::size_t number = 1;
         for (std::size_t i = 0; i < entries.size();) {
@@ -106,7 +117,7 @@ public:
             PrepareRest(number);
         }
         if (_result.impossible.empty()) {
-            for (auto& loss : RoundTripLosses(_result.text, _provider, _reader)) {
+            for (auto& loss : RoundTripLosses(_result.text, _provider, _files)) {
                 _result.impossible.push_back({0, {}, {}, std::move(loss)});
             }
         }
@@ -240,7 +251,8 @@ private:
     }
 
     ProviderEntries const& _provider;
-    PAMPolicyReader const& _reader;
+    HostFiles const& _files;
+    PAMPolicyReader _reader;
     bool _acceptLoss;
     std::vector<std::string_view> _lines;
     PAMMeaning _meaning;
@@ -249,9 +261,9 @@ private:
 
 } // namespace
 
-Prepared PreparePAM(std::string_view text, ProviderEntries const& provider,
-                    PAMPolicyReader const& reader, bool acceptLoss) {
-    return PAMPreparation(text, provider, reader, acceptLoss).Take();
+Prepared PreparePAM(std::string_view text, ProviderEntries const& provider, HostFiles const& files,
+                    bool acceptLoss) {
+    return PAMPreparation(text, provider, files, acceptLoss).Take();
 }
 
 } // namespace tessel::tslauthctl

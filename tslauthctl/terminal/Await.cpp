@@ -4,7 +4,7 @@
 #include "terminal/Console.h"
 #include "terminal/SignalWatch.h"
 
-#include <SystemFile.h>
+#include <base/FileError.h>
 
 #include <algorithm>
 #include <array>
@@ -23,7 +23,7 @@ namespace tessel::tslauthctl {
 
 namespace {
 
-using authentication::SystemText;
+using base::SystemText;
 using Clock = std::chrono::steady_clock;
 
 /// Workers that have not ended.

@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "terminal/Console.h"
 
-#include "terminal/Text.h"
+#include "terminal/EscapedText.h"
+
+#include <base/AsciiText.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -128,7 +130,7 @@ void Console::Note(std::string_view text) {
 }
 
 void Console::Diff(std::string_view text) {
-    for (auto line : Lines(text)) {
+    for (auto line : base::AsciiText::Lines(text)) {
         line = line.substr(0, line.find('\n'));
         auto const shown = Escaped(line);
         if (line.substr(0, 4) == "--- " || line.substr(0, 4) == "+++ ") {

@@ -2,10 +2,10 @@
 #include "terminal/Password.h"
 
 #include "terminal/Console.h"
+#include "terminal/EscapedText.h"
 #include "terminal/SignalWatch.h"
-#include "terminal/Text.h"
 
-#include <SystemFile.h>
+#include <base/FileError.h>
 
 #include <array>
 #include <cerrno>
@@ -23,7 +23,7 @@ namespace tessel::tslauthctl {
 
 namespace {
 
-using authentication::SystemText;
+using base::SystemText;
 
 constexpr char terminalPath[] = "/dev/tty";
 

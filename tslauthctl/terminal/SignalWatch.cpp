@@ -3,7 +3,7 @@
 
 #include "terminal/Console.h"
 
-#include <SystemFile.h>
+#include <base/FileError.h>
 
 #include <array>
 #include <atomic>
@@ -25,8 +25,7 @@ struct Pipe {
 
     Pipe() {
         if (pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK) != 0) {
-            throw Failure(ExitCode::failure,
-                          "Cannot make a pipe: " + authentication::SystemText(errno));
+            throw Failure(ExitCode::failure, "Cannot make a pipe: " + base::SystemText(errno));
         }
     }
 };

@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "terminal/UnifiedDiff.h"
 
-#include "terminal/Text.h"
+#include "terminal/EscapedText.h"
+
+#include <base/AsciiText.h>
 
 #if defined(__GNUC__)
 #pragma GCC diagnostic push
@@ -119,7 +121,7 @@ std::string UnifiedDiff(std::string const& path, std::string_view before, std::s
     if (before == after) {
         return {};
     }
-    auto const steps = EditSteps(Lines(before), Lines(after));
+    auto const steps = EditSteps(base::AsciiText::Lines(before), base::AsciiText::Lines(after));
     std::string out = "--- " + path + "\n+++ " + path + "\n";
     std::size_t oldLine = 0;
     std::size_t newLine = 0;

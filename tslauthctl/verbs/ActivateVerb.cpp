@@ -1,28 +1,25 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Host.h"
-#include "analysis/Plan.h"
-#include "terminal/Text.h"
-#include "verbs/ControlLock.h"
+#include "analysis/Failures.h"
+#include "analysis/HostFile.h"
+#include "analysis/HostPlan.h"
+#include "analysis/KnownStores.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/AuthenticationStore.h>
 #include <tslauth/Exceptions.h>
 
-#include <SystemFile.h>
+#include <base/AsciiText.h>
 
 namespace tessel::tslauthctl {
 
 namespace {
 
 /// The files that are no longer what they were when the plan was made.
-std::vector<std::string> ChangedFiles(Plan const& plan) {
+std::vector<std::string> ChangedFiles(HostPlan const& plan) {
     std::vector<std::string> changed;
-    for (auto const& file : plan.files) {
-        try {
-            if (authentication::ReadFile(file.path) != file.before) {
-                changed.push_back(file.path);
-            }
-        } catch (authentication::IOError const&) {
+    for (auto const& file : plan.preview.files) {
+        if (HostFileOrNothing(file.path) != file.before) {
             changed.push_back(file.path);
         }
     }
@@ -42,17 +39,17 @@ void MakeActive(std::string const& store) {
 ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console) {
     RequireStore(store);
     RequireRoot("activate");
-    ControlLock const lock(console);
-    auto const plan = MakePlan(store);
+    HostChange const change(console);
+    auto const plan = MakeHostPlan(store);
     auto& document = console.Document();
     document["changed"] = nlohmann::json::array();
     document["store"] = store;
     document["recorded"] = nullptr;
-    if (!plan.recorded.empty() || !plan.refusal) {
-        document["recorded"] = plan.recorded;
+    if (plan.recorded) {
+        document["recorded"] = *plan.recorded;
     }
     document["losses"] = nlohmann::json::array();
-    for (auto const& file : plan.files) {
+    for (auto const& file : plan.preview.files) {
         for (auto const& loss : file.losses) {
             document["losses"].push_back({{"path", file.path}, {"loss", loss}});
         }
@@ -61,10 +58,9 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
     // nothing the next time. So that is a loss to be accepted; an unknown store has left nothing
     // that could be taken out, and there is no other way away from it.
     bool const leavesEntries =
-        store == NoStore && plan.refusal && !plan.refusedAfterwards && !plan.files.empty();
+        store == NoStore && plan.refusal && !plan.refusedAfterwards && !plan.preview.files.empty();
     if (plan.refusal && !plan.refusedAfterwards && !(leavesEntries && acceptLoss)) {
-        console.Error(
-            Failure(ExitCode::refused, plan.refusal->message, plan.refusal->exceptionClass));
+        console.Error(*plan.refusal);
         console.ErrorDetail("nothing was changed");
         if (leavesEntries) {
             console.ErrorDetail("with --accept-loss 'None' is recorded all the same, and the "
@@ -73,11 +69,11 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         AddPrepareHint(*plan.refusal, console);
         return ExitCode::refused;
     }
-    if (plan.Loses() && !acceptLoss) {
+    if (plan.preview.Loses() && !acceptLoss) {
         console.Error(
             Failure(ExitCode::loss,
                     "Activating '" + store + "' would lose what follows; nothing was changed"));
-        for (auto const& file : plan.files) {
+        for (auto const& file : plan.preview.files) {
             for (auto const& loss : file.losses) {
                 console.ErrorDetail(file.path + ": " + loss);
             }
@@ -104,7 +100,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
     for (auto const& path : changed) {
         console.Line("changed " + path);
     }
-    for (auto const& file : plan.files) {
+    for (auto const& file : plan.preview.files) {
         for (auto const& loss : file.losses) {
             console.Warning(file.path + ": " + loss + ", as accepted");
         }
@@ -112,7 +108,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
     console.Warnings(plan.warnings);
     console.Line("'" + store + "' is active; " +
                  (changed.empty() ? "nothing had to be changed"
-                                  : Counted(changed.size(), "file") + " changed") +
+                                  : base::AsciiText::Counted(changed.size(), "file") + " changed") +
                  ".");
     return ExitCode::done;
 }

@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
 #include "analysis/Failures.h"
-#include "verbs/ControlLock.h"
+#include "analysis/JoinedDomain.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/CAMThumbprintStore.h>
 #include <tslauth/Exceptions.h>
 
-#include <Paths.h>
+#include <tslauth/Paths.h>
 
 namespace tessel::tslauthctl {
 
@@ -35,7 +35,7 @@ ExitCode RunCAMImport(std::string const& server, std::string const& file, Limit 
     document["thumbprint"] = nullptr;
     document["replaced"] = nullptr;
     auto const store = OpenStore(limit);
-    ControlLock const lock(console);
+    HostChange const change(console);
     auto const before = PinnedFor(server);
     Explaining(Account::none, [&] { store->ImportCertificateForCAM(file, server); });
     auto const now = PinnedFor(server);

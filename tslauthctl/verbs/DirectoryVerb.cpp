@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
 #include "analysis/Failures.h"
-#include "verbs/ControlLock.h"
+#include "analysis/JoinedDomain.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/Exceptions.h>
@@ -71,7 +71,7 @@ ExitCode RunCanonical(std::string const& name, Limit limit, Console& console) {
 ExitCode RunPreferredDCs(Limit limit, Console& console) {
     auto& document = console.Document();
     document["controllers"] = nullptr;
-    auto const provider = OpenProvider(limit);
+    auto const provider = OpenProvider();
     auto const controllers = Explaining(Account::none, [&] {
         return Ask(console, "the provider's list of preferred domain controllers", limit,
                    [provider] { return provider->GetPreferredDomainControllers(); });
@@ -83,15 +83,14 @@ ExitCode RunPreferredDCs(Limit limit, Console& console) {
     return ExitCode::done;
 }
 
-ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Limit limit,
-                            Console& console) {
+ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Console& console) {
     RequireRoot("preferred-dcs");
     auto& document = console.Document();
     document["controllers"] = nullptr;
     // Not through the store, which takes it for done where the provider cannot do it.
-    auto const provider = OpenProvider(limit);
+    auto const provider = OpenProvider();
     std::deque<std::string> const list(controllers.begin(), controllers.end());
-    ControlLock const lock(console);
+    HostChange const change(console);
     Explaining(Account::none, [&] {
         Wait(console,
              Start("the provider to take the list of preferred domain controllers", std::nullopt,

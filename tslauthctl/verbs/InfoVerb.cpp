@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
 #include "analysis/Failures.h"
-#include "analysis/Host.h"
+#include "analysis/JoinedDomain.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/Exceptions.h>
+#include <tslauth/ProviderConfiguration.h>
 
 #include <exception>
 
@@ -158,7 +158,7 @@ template <typename Value> std::optional<Value> ValueOf(Answered<Value> const& an
 ExitCode RunInfo(Limit limit, Console& console) {
     auto& document = console.Document();
     document["provider"] = nullptr;
-    auto const provider = OpenProvider(limit);
+    auto const provider = OpenProvider();
     auto const name = ConfiguredProvider();
     document["provider"] = name;
     document["joined"] = nullptr;

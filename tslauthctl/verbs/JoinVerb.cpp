@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
 #include "analysis/Failures.h"
+#include "analysis/JoinedDomain.h"
 #include "terminal/Password.h"
-#include "verbs/ControlLock.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 namespace tessel::tslauthctl {
@@ -28,7 +28,7 @@ void CheckUsage(JoinArguments const& arguments) {
 
 /// @param join what runs on the worker; holds everything that it needs
 void Join(Account account, std::string const& what, Console& console, std::function<void()> join) {
-    ControlLock const lock(console);
+    HostChange const change(console);
     Explaining(account, [&] { Wait(console, Start(what, std::nullopt, std::move(join))); });
 }
 

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
 #include "analysis/Failures.h"
+#include "analysis/JoinedDomain.h"
 #include "terminal/Password.h"
-#include "verbs/ControlLock.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 namespace tessel::tslauthctl {
@@ -34,7 +34,7 @@ ExitCode RunPart(AccountArguments const& arguments, Limit limit, Console& consol
     auto& document = console.Document();
     document["parted"] = false;
     auto const part = PartCall(arguments, limit);
-    ControlLock const lock(console);
+    HostChange const change(console);
     OnJoinedHost(console, limit, [&] {
         Explaining(arguments.user ? Account::given : Account::none, [&] {
             Wait(console,

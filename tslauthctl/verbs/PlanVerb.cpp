@@ -1,39 +1,38 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Host.h"
-#include "analysis/Plan.h"
-#include "terminal/Text.h"
+#include "analysis/HostPlan.h"
+#include "analysis/KnownStores.h"
 #include "terminal/UnifiedDiff.h"
 #include "verbs/Verbs.h"
 
 namespace tessel::tslauthctl {
 
-void AddPrepareHint(Refusal const& refusal, Console& console) {
-    bool const reader = refusal.exceptionClass.rfind("SystemConfiguration::", 0) == 0 ||
-                        refusal.exceptionClass == "std::out_of_range";
+void AddPrepareHint(Failure const& refusal, Console& console) {
+    bool const reader = refusal.ExceptionClass().rfind("SystemConfiguration::", 0) == 0 ||
+                        refusal.ExceptionClass() == "std::out_of_range";
     if (reader) {
         console.ErrorDetail(
             "'tslauthctl prepare' shows what keeps the library from reading a file");
     }
 }
 
-void DescribePlan(Plan const& plan, Console& console) {
+void DescribePlan(HostPlan const& plan, Console& console) {
     auto& document = console.Document();
     document["store"] = plan.store;
     document["recorded"] = nullptr;
-    if (!plan.recorded.empty() || !plan.refusal) {
-        document["recorded"] = plan.recorded;
+    if (plan.recorded) {
+        document["recorded"] = *plan.recorded;
     }
     auto& files = document["files"] = nlohmann::json::array();
-    for (auto const& file : plan.files) {
+    for (auto const& file : plan.preview.files) {
         auto const diff = UnifiedDiff(file.path, file.before, file.after);
         files.push_back({{"path", file.path},
-                         {"changed", file.before != file.after},
+                         {"changed", file.Changes()},
                          {"diff", diff},
                          {"losses", file.losses},
                          {"notes", file.notes}});
         console.Diff(diff);
     }
-    for (auto const& file : plan.files) {
+    for (auto const& file : plan.preview.files) {
         for (auto const& loss : file.losses) {
             console.Warning(file.path + ": " + loss);
         }
@@ -44,32 +43,31 @@ void DescribePlan(Plan const& plan, Console& console) {
     console.Warnings(plan.warnings);
     document["refusal"] = nullptr;
     if (plan.refusal) {
-        document["refusal"] = {{"message", plan.refusal->message},
-                               {"exception", plan.refusal->exceptionClass},
+        document["refusal"] = {{"message", plan.refusal->what()},
+                               {"exception", plan.refusal->ExceptionClass()},
                                {"afterwards", plan.refusedAfterwards}};
     }
 }
 
 ExitCode RunPlan(std::string const& store, Console& console) {
     RequireStore(store);
-    auto const plan = MakePlan(store);
+    auto const plan = MakeHostPlan(store);
     DescribePlan(plan, console);
     if (plan.refusal) {
-        console.Error(
-            Failure(ExitCode::refused, plan.refusal->message, plan.refusal->exceptionClass));
+        console.Error(*plan.refusal);
         console.ErrorDetail(plan.refusedAfterwards
                                 ? "the library would write the above first, and then refuse"
                                 : "the library would refuse; nothing would be changed");
         AddPrepareHint(*plan.refusal, console);
         return ExitCode::refused;
     }
-    if (plan.Loses()) {
+    if (plan.preview.Loses()) {
         console.Warning("Activating '" + store +
                         "' would lose the above; it is refused without "
                         "--accept-loss. See 'tslauthctl prepare'.");
         return ExitCode::loss;
     }
-    if (!plan.Changes()) {
+    if (!plan.preview.Changes()) {
         console.Line("Activating '" + store + "' would change nothing.");
         return ExitCode::done;
     }

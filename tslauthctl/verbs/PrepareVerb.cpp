@@ -1,17 +1,18 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Host.h"
+#include "analysis/HostFile.h"
 #include "analysis/Prepare.h"
-#include "terminal/Text.h"
 #include "terminal/UnifiedDiff.h"
-#include "verbs/ControlLock.h"
+#include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
-#include <Paths.h>
-#include <SystemFile.h>
+#include <base/FileError.h>
+#include <base/WholeFile.h>
+#include <tslauth/ActiveDirectoryStore.h>
+#include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
 
 #include <cerrno>
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace tessel::tslauthctl {
@@ -33,25 +34,19 @@ std::string KeepOriginal(std::string const& path) {
             return kept;
         }
         if (int const error = errno; error != EEXIST) {
-            ThrowIOError("Cannot keep the original as '" + kept + "'", error);
+            throw IOError("Cannot keep the original as '" + kept + "': " + base::SystemText(error));
         }
     }
 }
 
-/// Replaces the file and keeps its owner; the mode is kept by the replacing itself.
+/// Replaces the file, which stays what it was in all but its text.
+/// @return the name of the original
 std::string Write(std::string const& path, std::string const& text) {
-    struct stat status = {};
-    if (stat(path.c_str(), &status) != 0) {
-        int const error = errno;
-        ThrowIOError("Cannot open '" + path + "'", error);
-    }
     auto kept = KeepOriginal(path);
-    ReplaceFile(path, text);
-    if (status.st_uid != geteuid() || status.st_gid != getegid()) {
-        if (chown(path.c_str(), status.st_uid, status.st_gid) != 0) {
-            int const error = errno;
-            ThrowIOError("Cannot give '" + path + "' its owner back", error);
-        }
+    try {
+        base::ReplaceFile(path, text);
+    } catch (base::FileError const& e) {
+        throw IOError(e.what());
     }
     return kept;
 }
@@ -115,7 +110,7 @@ void Describe(PreparedFile const& file, bool write, Console& console) {
 /// The configured provider's entries, or such as any provider might bring.
 ProviderEntries EntriesToCarry(Console& console) {
     try {
-        return LoadProvider();
+        return ActiveDirectoryStore(0).GetProviderEntries();
     } catch (std::exception const& e) {
         console.Note(std::string("no provider can be loaded, one is assumed: ") + e.what());
         return PlaceholderEntries();
@@ -124,10 +119,10 @@ ProviderEntries EntriesToCarry(Console& console) {
 
 ExitCode Prepare(bool write, bool acceptLoss, Console& console) {
     auto const entries = EntriesToCarry(console);
-    auto const policy = ReadFile(Paths::PAMPolicy);
-    auto const services = ReadFile(Paths::NSSConfiguration);
+    auto const policy = ReadHostFile(Paths::PAMPolicy);
+    auto const services = ReadHostFile(Paths::NSSConfiguration);
     PreparedFile const files[] = {
-        {Paths::PAMPolicy, policy, PreparePAM(policy, entries, ReadPolicy, acceptLoss)},
+        {Paths::PAMPolicy, policy, PreparePAM(policy, entries, HostFileOrNothing, acceptLoss)},
         {Paths::NSSConfiguration, services, PrepareNSS(services, entries, acceptLoss)}};
     bool changes = false;
     bool loses = false;
@@ -163,7 +158,7 @@ ExitCode RunPrepare(bool write, bool acceptLoss, Console& console) {
         return Prepare(write, acceptLoss, console);
     }
     RequireRoot("prepare --write");
-    ControlLock const lock(console);
+    HostChange const change(console);
     return Prepare(write, acceptLoss, console);
 }
 

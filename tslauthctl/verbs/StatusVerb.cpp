@@ -1,14 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Agreement.h"
-#include "analysis/Host.h"
+#include "analysis/Failures.h"
+#include "analysis/HostFile.h"
+#include "analysis/KnownStores.h"
+#include "analysis/ProviderOnHost.h"
 #include "verbs/Verbs.h"
 
+#include <tslauth/ActiveDirectoryStore.h>
+#include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
 
-#include <Paths.h>
-#include <SystemFile.h>
+#include <tslauth/Paths.h>
 
-#include <algorithm>
 #include <optional>
 
 namespace tessel::tslauthctl {
@@ -41,7 +44,7 @@ Agreement DescribeFile(char const* path, bool providerKnown, Parts const& parts,
     nlohmann::json error = nullptr;
     if (providerKnown) {
         try {
-            found = parts(ReadFile(path));
+            found = parts(ReadHostFile(path));
         } catch (IOError const& e) {
             error = e.what();
         }
@@ -67,15 +70,14 @@ Agreement DescribeFile(char const* path, bool providerKnown, Parts const& parts,
 
 ExitCode RunStatus(Console& console) {
     auto const recorded = RecordedStore();
-    auto const known = Stores().GetRegisteredStores();
-    bool const isKnown = std::find(known.begin(), known.end(), recorded) != known.end();
+    bool const isKnown = IsKnownStore(recorded);
     bool const wanted = recorded == ActiveDirectory;
     auto& document = console.Document();
     document["recorded"] = recorded;
     document["known"] = isKnown;
     console.Line("store: " + recorded + (isKnown ? "" : " (unknown to the library)"));
 
-    auto const name = ConfiguredProvider();
+    auto const name = ProviderName();
     auto& provider = document["provider"] = {{"name", nullptr},
                                              {"loaded", false},
                                              {"pam_module", nullptr},
@@ -88,7 +90,7 @@ ExitCode RunStatus(Console& console) {
     std::vector<std::string> warnings;
     std::string const shown = name.empty() ? "none" : name;
     try {
-        entries = LoadProvider();
+        entries = ActiveDirectoryStore(0).GetProviderEntries();
         provider["loaded"] = true;
         provider["pam_module"] = entries->pam.module();
         provider["nss_module"] = entries->nss.module();

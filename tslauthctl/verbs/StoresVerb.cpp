@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Host.h"
+#include "analysis/Failures.h"
+#include "analysis/KnownStores.h"
 #include "verbs/Verbs.h"
 
+#include <tslauth/AuthenticationConfiguration.h>
 #include <tslauth/Exceptions.h>
 
 namespace tessel::tslauthctl {
@@ -13,7 +15,7 @@ ExitCode RunStores(Console& console) {
     std::string recorded;
     auto code = ExitCode::done;
     try {
-        recorded = RecordedStore();
+        recorded = authentication::RecordedStore();
         document["recorded"] = recorded;
     } catch (authentication::Exception const& e) {
         console.Error(Refused(e));

@@ -15,8 +15,7 @@
 /// could not do their work.
 namespace tessel::tslauthctl {
 
-struct Plan;
-struct Refusal;
+struct HostPlan;
 
 ExitCode RunStores(Console& console);
 ExitCode RunStatus(Console& console);
@@ -47,8 +46,7 @@ ExitCode RunDC(std::string const& domain, Limit limit, Console& console);
 ExitCode RunPrincipal(std::string const& domain, Limit limit, Console& console);
 ExitCode RunCanonical(std::string const& name, Limit limit, Console& console);
 ExitCode RunPreferredDCs(Limit limit, Console& console);
-ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Limit limit,
-                            Console& console);
+ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Console& console);
 ExitCode RunCAMImport(std::string const& server, std::string const& file, Limit limit,
                       Console& console);
 ExitCode RunCAMList(Console& console);
@@ -56,10 +54,10 @@ ExitCode RunCAMDomain(std::string const& server, Limit limit, Console& console);
 
 /// What `plan` shows of a plan, and `activate` before it refuses: JSON fields "store", "recorded",
 /// "files" and "refusal".
-void DescribePlan(Plan const& plan, Console& console);
+void DescribePlan(HostPlan const& plan, Console& console);
 
 /// Below a refusal that comes from the reader of a system file.
-void AddPrepareHint(Refusal const& refusal, Console& console);
+void AddPrepareHint(Failure const& refusal, Console& console);
 
 } // namespace tessel::tslauthctl
 

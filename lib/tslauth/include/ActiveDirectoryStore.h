@@ -2,6 +2,7 @@
 #ifndef TSLAUTH_ACTIVEDIRECTORYSTORE_H
 #define TSLAUTH_ACTIVEDIRECTORYSTORE_H
 
+#include "ActivationPlan.h"
 #include "ActiveDirectoryProvider.h"
 #include "ActiveDirectoryStoreConfiguration.h"
 #include "Credentials.h"
@@ -51,6 +52,14 @@ public:
     /// "Active Directory"
     std::string GetDisplayName() const override;
 
+    /// What the provider brings into the system files.
+    ProviderEntries GetProviderEntries() const;
+
+    /// What `MakeActive` and `MakeInactive` do, to be looked at before it is done. With a form other
+    /// than theirs, it is to be executed by the caller.
+    ActivationPlan GetActivationPlan(EditForm form = EditForm::Normalised) const;
+    ActivationPlan GetWithdrawalPlan(EditForm form = EditForm::Normalised) const;
+
     /// Makes this store the host's: puts the provider's module into "auth" and "account" of
     /// "/etc/pam.d/system-auth-generic", directly after pam_access.so or else first; puts its
     /// service first for "passwd", "group" and "shadow" in "/etc/nsswitch.conf"; records the name
@@ -62,7 +71,10 @@ public:
     ///
     /// @throws IOError where a file cannot be read or replaced; `authentication.conf` is read
     ///     first, so that a host without it stays untouched
-    /// @throws ConfigurationError, InvalidKeyException where `authentication.conf` is malformed
+    /// @throws ConfigurationError where a line of `authentication.conf` is malformed; the host is
+    ///     untouched then, too
+    /// @throws InvalidKeyException where `authentication.conf` lacks its key. That shows last, and
+    ///     both system files have been replaced by then
     /// @throws FilePermissionError where a file was replaced but its permissions may be wrong
     /// @throws SystemConfiguration::InvalidFacilityException,
     ///     SystemConfiguration::InvalidControlException,
@@ -89,6 +101,20 @@ public:
     /// @throws the provider's failure, where it came in time
     /// @throws ThreadErrorException where no worker can be started or waited for
     int GetDomainTrustState() const;
+
+    /// The three questions above for whoever wants the truth now: the answer is the provider's own,
+    /// never a remembered one, and a failure is never an empty answer. Each runs on a worker of its
+    /// own, at most one a question in the process besides those above; whoever finds one running
+    /// waits for it within the timeout.
+    /// @param timeout seconds to wait at most
+    /// @throws the provider's failure, `CallNotImplementedException` among it. Of the configuration,
+    ///     the first failure of its three fields; a field that the provider does not offer is empty
+    /// @throws ProviderCallTimedOutException where there is no answer in time. The worker goes on
+    ///     until the provider answers
+    /// @throws ThreadErrorException where no worker can be started or waited for
+    ActiveDirectoryStoreConfiguration AskStoreConfiguration(int timeout) const;
+    std::deque<Domain> AskTrustedDomains(int timeout) const;
+    int AskDomainTrustState(int timeout) const;
 
     /// How the host's domain stands with `domain`, in the provider's numbers; 0 where the provider
     /// does not answer the question. Blocks as long as the provider does.

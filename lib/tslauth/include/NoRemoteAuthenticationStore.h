@@ -2,6 +2,7 @@
 #ifndef TSLAUTH_NOREMOTEAUTHENTICATIONSTORE_H
 #define TSLAUTH_NOREMOTEAUTHENTICATIONSTORE_H
 
+#include "ActivationPlan.h"
 #include "RemoteAuthenticationStore.h"
 
 namespace tessel {
@@ -26,6 +27,11 @@ public:
     /// "None"
     std::string GetDisplayName() const override;
 
+    /// What `MakeActive` would do now, to be looked at before it is done.
+    /// @throws IOError, ConfigurationError, InvalidKeyException where `authentication.conf` cannot
+    ///     be read
+    ActivationPlan GetActivationPlan() const;
+
     /// Records "None" and withdraws the store that was recorded before. Where "None" is recorded
     /// already, nothing is written and no store is touched.
     ///
@@ -45,6 +51,9 @@ public:
     /// Always throws `std::runtime_error`, which is not an `Exception`, with the text "Attempted to
     /// disable None Store": a host stops being local by activating another store.
     void MakeInactive() override;
+
+private:
+    ActivationPlan PlanFor(AuthenticationConfiguration const& record) const;
 };
 
 } // namespace authentication

@@ -3,6 +3,7 @@
 #define TSLAUTH_TSLAUTH_H
 
 /// Everything that the library offers. Each header can also be included alone.
+#include "ActivationPlan.h"
 #include "ActiveDirectoryProvider.h"
 #include "ActiveDirectoryStore.h"
 #include "ActiveDirectoryStoreConfiguration.h"
@@ -22,8 +23,10 @@
 #include "Exception.h"
 #include "Exceptions.h"
 #include "Export.h"
+#include "HostLock.h"
 #include "LibraryHandle.h"
 #include "NoRemoteAuthenticationStore.h"
+#include "Paths.h"
 #include "ProviderConfiguration.h"
 #include "RemoteAuthenticationStore.h"
 #include "RequestState.h"

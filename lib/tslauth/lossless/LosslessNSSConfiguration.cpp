@@ -1,13 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "LosslessNSSConfiguration.h"
 
-#include "analysis/Loss.h"
-#include "analysis/NSSMeaning.h"
 #include "WholeLines.h"
 #include "systemconfiguration/NSSConfigurationText.h"
 #include "systemconfiguration/Words.h"
 
 #include <base/AsciiText.h>
+#include <meaning/NSSMeaning.h>
 #include <tslauth/Exceptions.h>
 
 #include <algorithm>
@@ -20,8 +19,8 @@
 namespace tessel::authentication::ProviderModules {
 
 using namespace SystemConfiguration;
-using tslauthctl::NSSLine;
-using tslauthctl::NSSServices;
+using meaning::NSSLine;
+using meaning::NSSServices;
 
 namespace {
 
@@ -37,7 +36,7 @@ std::vector<Line> LinesFor(std::string_view database, std::string_view text) {
     auto const* const start = text.data();
     while (!text.empty()) {
         auto const line = base::AsciiText::TakeLine(text);
-        auto meaning = tslauthctl::ReadNSSLine(line);
+        auto meaning = meaning::ReadNSSLine(line);
         if (meaning && meaning->database == database) {
             lines.push_back(
                 {static_cast<std::size_t>(line.data() - start), line, std::move(*meaning)});
@@ -72,7 +71,7 @@ std::vector<std::size_t> IndicesOf(NSSService const& service,
 }
 
 NSSServices::const_iterator Find(NSSService const& service, NSSServices const& services) {
-    auto const sought = tslauthctl::Meaning(service);
+    auto const sought = Meaning(service);
     return sought.empty()
                ? services.end()
                : std::search(services.begin(), services.end(), sought.begin(), sought.end());
@@ -94,7 +93,7 @@ std::string TextOf(NSSService const& service) {
 /// A line for a database that has none, below the comment by which both are known again.
 std::string AddedLines(std::string const& database) {
     auto const services =
-        tslauthctl::NSSText(tslauthctl::DefaultNSSServices(database).value_or(NSSServices()));
+        meaning::NSSText(meaning::DefaultNSSServices(database).value_or(NSSServices()));
     return "# Added by tslauth: without a line, '" + database + "' is looked up in '" + services +
            "'.\n" + database + ": " + services + "\n";
 }
@@ -155,7 +154,7 @@ bool TakeOut(NSSService const& service, Line const& line, std::string& text) {
     if (first == services.end()) {
         return false;
     }
-    auto const last = first + static_cast<std::ptrdiff_t>(tslauthctl::Meaning(service).size()) - 1;
+    auto const last = first + static_cast<std::ptrdiff_t>(Meaning(service).size()) - 1;
     auto begin = first->begin;
     auto end = last->end;
     auto const isBlank = [&](std::size_t at) {

@@ -1,15 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "LosslessPAMPolicy.h"
 
-#include "analysis/Loss.h"
-#include "analysis/PAMMeaning.h"
-#include "Paths.h"
 #include "WholeLines.h"
 #include "systemconfiguration/PAMPolicyText.h"
 #include "systemconfiguration/PAMReader.h"
 #include "systemconfiguration/Words.h"
 
+#include <meaning/PAMMeaning.h>
 #include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -80,10 +79,10 @@ View SystemView(std::string_view text, PAMFacility::Facility facility, PAMEntry 
     starts.push_back(text.size());
 
     auto const word = std::string(Words::WordOf<PAMFacility>(facility));
-    auto const meaning = tslauthctl::ReadPAMMeaning(text);
-    auto const sought = tslauthctl::Meaning(entry, word);
+    auto const meaning = meaning::ReadPAMMeaning(text);
+    auto const sought = Meaning(entry, word);
     View view{{}, meaning.lines.empty() ? text.size() : starts[meaning.lines.front().first - 1]};
-    for (auto const& line : tslauthctl::PAMStackOf(meaning, word)) {
+    for (auto const& line : meaning::PAMStackOf(meaning, word)) {
         view.stack.push_back({starts[line.first - 1], starts[line.last], line == sought,
                               line.module == AccessModule()});
     }
@@ -167,7 +166,7 @@ std::string LosslessPAMPolicy(std::string_view text, Edit edit, PAMEntry const& 
     switch (edit) {
     case Edit::insert:
         RefuseNul(text);
-        if (tslauthctl::ReadPAMMeaning(text).unreadable) {
+        if (meaning::ReadPAMMeaning(text).unreadable) {
             throw ConfigurationError("libpam refuses the policy: its last line is continued, or a "
                                      "line is too long");
         }

@@ -1,19 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Agreement.h"
 
-#include "analysis/Prepare.h"
-
 #include <gtest/gtest.h>
 
 namespace tessel::tslauthctl {
 namespace {
 
-using namespace authentication::ProviderModules;
+authentication::ProviderEntries const provider =
+    authentication::MakeProviderEntries("pam_prov.so", {"a"}, "prov", {});
 
 TEST(AgreementTest, AFileIsInStepPartlyOrNotAtAll) {
-    auto const provider = NSSServiceFor("prov", {});
     auto const together = [&](char const* text, bool wanted) {
-        return Together(NSSParts(text, provider, wanted));
+        return Together(NSSParts(text, provider.nss, wanted));
     };
     constexpr char all[] = "passwd: prov files\ngroup: prov\nshadow: files prov\n";
     constexpr char some[] = "passwd: prov files\ngroup: files\nshadow: files\n";
@@ -28,10 +26,9 @@ TEST(AgreementTest, AFileIsInStepPartlyOrNotAtAll) {
 }
 
 TEST(AgreementTest, AnEntryCountsAsLibpamReadsIt) {
-    auto const entry = PAMEntryFor("pam_prov.so", {"a"});
     auto const parts = PAMParts("AUTH Sufficient \\\n /lib/security/$ISA/pam_prov.so a # c\n"
                                 "account sufficient /lib/security/$ISA/pam_prov.so b\n",
-                                entry, true);
+                                provider.pam, true);
     ASSERT_EQ(2U, parts.size());
     EXPECT_EQ("auth", parts[0].name);
     EXPECT_EQ(Agreement::inStep, parts[0].agreement);

@@ -170,5 +170,9 @@ TEST(FailuresTest, AnAnswerComesThrough) {
     EXPECT_EQ(7, Explaining(Account::none, [] { return 7; }));
 }
 
+TEST(FailuresTest, TheClassOfAnExceptionIsNamedInFull) {
+    EXPECT_EQ("std::out_of_range", ClassName(std::out_of_range("x")));
+}
+
 } // namespace
 } // namespace tessel::tslauthctl

@@ -1,14 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Prepare.h"
 
+#include <tslauth/Paths.h>
+
+#include <base/AsciiText.h>
 #include <gmock/gmock.h>
+#include <meaning/NSSMeaning.h>
 
 #include <random>
 
 namespace tessel::tslauthctl {
 namespace {
 
-using namespace authentication::ProviderModules;
+using namespace base::AsciiText;
+using namespace meaning;
 using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::SizeIs;
@@ -132,8 +137,7 @@ TEST(PrepareNSSTest, AnAcceptedLossIsEditedAndStillNamed) {
 }
 
 TEST(PrepareNSSTest, AProviderWithParametersCannotBeCarriedBack) {
-    ProviderEntries const provider{PAMEntryFor("p.so", {}),
-                                   NSSServiceFor("p", {"NOTFOUND=return"})};
+    auto const provider = authentication::MakeProviderEntries("p.so", {}, "p", {"NOTFOUND=return"});
     EXPECT_FALSE(PrepareNSS(provided, provider, false).impossible.empty());
 }
 
@@ -171,6 +175,14 @@ TEST(PrepareNSSTest, AnyBytesArePreparedOrGivenUp) {
     }
 }
 
+/// What activating the provider's store, and leaving it again, costs a name-service switch.
+std::vector<std::string> LossesOf(std::string const& text, ProviderEntries const& provider) {
+    return authentication::ActivationPlan::Activating(provider, {})
+        .PreviewOf(authentication::Paths::NSSConfiguration,
+                   [&](std::string const& /*path*/) { return text; })
+        .losses;
+}
+
 TEST(PrepareNSSTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(7);
     auto const provider = PlaceholderEntries();
@@ -197,11 +209,8 @@ TEST(PrepareNSSTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
                 ASSERT_TRUE(was && is && SameEffect(*was, *is)) << entry.first << "\n" << text;
             }
         }
-        auto const active = EditedNSSConfiguration(prepared.text, Edit::insert, provider.nss);
-        ASSERT_THAT(NSSLosses(prepared.text, active, Edit::insert, provider.nss), IsEmpty())
-            << text;
-        auto const back = EditedNSSConfiguration(active, Edit::remove, provider.nss);
-        ASSERT_THAT(NSSLosses(active, back, Edit::remove, provider.nss), IsEmpty()) << text;
+        ASSERT_THAT(LossesOf(prepared.text, provider), IsEmpty()) << text << "\n=>\n"
+                                                                  << prepared.text;
         ASSERT_EQ(prepared.text, PrepareNSS(prepared.text, provider, false).text);
         ASSERT_EQ(prepared.edits.empty(), prepared.text == text) << text;
     }

@@ -1,26 +1,30 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Prepare.h"
 
+#include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
+
 #include <gmock/gmock.h>
+#include <meaning/PAMMeaning.h>
 
 #include <random>
 
 namespace tessel::tslauthctl {
 namespace {
 
-using namespace authentication::ProviderModules;
+using namespace meaning;
 using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::SizeIs;
 
-std::optional<std::string> ReadTestPolicy(std::string const& name) {
-    if (name == "login") {
+std::optional<std::string> ReadTestPolicy(std::string const& path) {
+    if (path == "/etc/pam.d/login") {
         return "auth required u.so\n@include more\n";
     }
-    if (name == "more") {
+    if (path == "/usr/lib/pam.d/more") {
         return "session required s.so\n";
     }
-    if (name == "bad") {
+    if (path == "/etc/pam.d/bad") {
         return "auth required u.so\nbogus required u.so\n";
     }
     return std::nullopt;
@@ -180,6 +184,17 @@ TEST(PreparePAMTest, AnyBytesArePreparedOrGivenUp) {
     }
 }
 
+/// What activating the provider's store, and leaving it again, costs a policy.
+std::vector<std::string> LossesOf(std::string const& policy, ProviderEntries const& provider) {
+    auto const read = [&](std::string const& path) {
+        auto const text = path == authentication::Paths::PAMPolicy ? policy : ReadTestPolicy(path);
+        return text ? *text : throw authentication::IOError(path);
+    };
+    return authentication::ActivationPlan::Activating(provider, {})
+        .PreviewOf(authentication::Paths::PAMPolicy, read)
+        .losses;
+}
+
 TEST(PreparePAMTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
     std::mt19937 random(11);
     auto const provider = PlaceholderEntries();
@@ -194,13 +209,7 @@ TEST(PreparePAMTest, WhatIsPreparedLosesNothingAndMeansTheSame) {
             continue;
         }
         ++carried;
-        auto const active = EditedPAMPolicy(prepared.text, Edit::insert, provider.pam);
-        ASSERT_THAT(PAMLosses(prepared.text, active, Edit::insert, provider.pam, ReadTestPolicy),
-                    IsEmpty())
-            << text;
-        auto const back = EditedPAMPolicy(active, Edit::remove, provider.pam);
-        ASSERT_THAT(PAMLosses(active, back, Edit::remove, provider.pam, ReadTestPolicy), IsEmpty())
-            << text;
+        ASSERT_THAT(LossesOf(prepared.text, provider), IsEmpty()) << text;
         ASSERT_EQ(Expanded(text), Expanded(prepared.text)) << text << "\n=>\n" << prepared.text;
         ASSERT_EQ(prepared.text, PreparePAM(prepared.text, provider, ReadTestPolicy, false).text);
     }

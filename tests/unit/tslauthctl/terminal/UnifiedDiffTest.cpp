@@ -1,8 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "terminal/UnifiedDiff.h"
 
-#include "terminal/Text.h"
-
+#include <base/AsciiText.h>
 #include <gtest/gtest.h>
 
 #include <random>
@@ -14,8 +13,8 @@ namespace {
 /// Applies a difference the way patch(1) does, but without any leeway: every line of the old text
 /// that the difference shows must stand exactly where it says.
 std::string Apply(std::string_view before, std::string_view diff) {
-    auto const old = Lines(before);
-    auto const steps = Lines(diff);
+    auto const old = base::AsciiText::Lines(before);
+    auto const steps = base::AsciiText::Lines(diff);
     std::string out;
     std::size_t next = 0;
     for (std::size_t i = 2; i < steps.size();) {

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#ifndef TSLAUTHCTL_NSSMEANING_H
-#define TSLAUTHCTL_NSSMEANING_H
+#pragma once
 
 #include <array>
 #include <map>
@@ -17,7 +16,7 @@
 ///   it, or one before the first service, ends the list;
 /// - a criterion that is not understood makes every look-up of the process fail;
 /// - a line ends at a NUL byte.
-namespace tessel::tslauthctl {
+namespace tessel::meaning {
 
 enum class NSSAction { proceed, leave, merge };
 
@@ -62,6 +61,9 @@ struct NSSLine {
     bool unreadRest = false;
 };
 
+/// The services of a list as it stands behind the colon of a line.
+NSSServices ReadNSSServices(std::string_view list);
+
 /// Nothing for a line without a meaning: blank, comment, or without anything after the first word.
 std::optional<NSSLine> ReadNSSLine(std::string_view line);
 
@@ -87,6 +89,4 @@ std::optional<NSSServices> EffectiveNSSServices(NSSMeaning const& meaning,
 /// status makes no difference, unless it merges.
 bool SameEffect(NSSServices left, NSSServices right);
 
-} // namespace tessel::tslauthctl
-
-#endif
+} // namespace tessel::meaning

@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/NSSMeaning.h"
+#include "NSSMeaning.h"
 
-#include "terminal/Text.h"
+#include <base/AsciiText.h>
 
-namespace tessel::tslauthctl {
+namespace tessel::meaning {
+
+using namespace base::AsciiText;
 
 namespace {
 
@@ -17,7 +19,7 @@ template <std::size_t size>
 std::optional<std::size_t> Find(std::array<std::string_view, size> const& names,
                                 std::string_view name) {
     for (std::size_t i = 0; i < size; ++i) {
-        if (EqualNoCase(names[i], name)) {
+        if (EqualsIgnoringCase(names[i], name)) {
             return i;
         }
     }
@@ -186,6 +188,11 @@ std::optional<NSSLine> ReadNSSLine(std::string_view line) {
     }
 }
 
+NSSServices ReadNSSServices(std::string_view list) {
+    auto line = ReadNSSLine("any: " + std::string(list));
+    return line ? std::move(line->services) : NSSServices();
+}
+
 NSSMeaning ReadNSSMeaning(std::string_view text) {
     NSSMeaning meaning;
     std::size_t number = 0;
@@ -242,4 +249,4 @@ bool SameEffect(NSSServices left, NSSServices right) {
     return left == right;
 }
 
-} // namespace tessel::tslauthctl
+} // namespace tessel::meaning

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/NSSMeaning.h"
-
 #include <gmock/gmock.h>
 
-namespace tessel::tslauthctl {
+#include <meaning/NSSMeaning.h>
+
+namespace tessel::meaning {
 namespace {
 
 using testing::ElementsAre;
@@ -111,4 +111,4 @@ TEST(NSSMeaningTest, TheLastServicesActionsMakeNoDifferenceUnlessTheyMerge) {
 }
 
 } // namespace
-} // namespace tessel::tslauthctl
+} // namespace tessel::meaning

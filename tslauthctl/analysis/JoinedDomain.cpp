@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Directory.h"
+#include "analysis/JoinedDomain.h"
 
 #include "analysis/Failures.h"
-#include "analysis/Host.h"
 
-#include <tslauth/Exceptions.h>
+#include <tslauth/ProviderConfiguration.h>
 
 namespace tessel::tslauthctl {
 
@@ -15,9 +14,7 @@ std::shared_ptr<ActiveDirectoryStore> OpenStore(Limit limit) {
                       [&] { return std::make_shared<ActiveDirectoryStore>(limit.seconds); });
 }
 
-std::shared_ptr<ActiveDirectoryProvider> OpenProvider(Limit limit) {
-    // The store first, for its exceptions.
-    (void)OpenStore(limit);
+std::shared_ptr<ActiveDirectoryProvider> OpenProvider() {
     return Explaining(Account::none, [] {
         return std::make_shared<ActiveDirectoryProvider>(ConfiguredProvider());
     });
@@ -26,7 +23,7 @@ std::shared_ptr<ActiveDirectoryProvider> OpenProvider(Limit limit) {
 namespace {
 
 Domain ActiveDomain(Console& console, Limit limit) {
-    auto const provider = OpenProvider(limit);
+    auto const provider = OpenProvider();
     return Explaining(Account::none, [&] {
         return Ask(console, "the provider to name the host's domain", limit,
                    [provider] { return provider->GetActiveDomain(); });

@@ -1,26 +1,18 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "terminal/Text.h"
+#include "terminal/EscapedText.h"
 
-#include <gmock/gmock.h>
+#include <gtest/gtest.h>
 
 namespace tessel::tslauthctl {
 namespace {
 
-using testing::ElementsAre;
-using testing::IsEmpty;
-
-TEST(TextTest, LinesKeepTheirLineFeeds) {
-    EXPECT_THAT(Lines("a\n\nb"), ElementsAre("a\n", "\n", "b"));
-    EXPECT_THAT(Lines(""), IsEmpty());
-}
-
-TEST(TextTest, ControlCharactersAreEscaped) {
+TEST(EscapedTextTest, ControlCharactersAreEscaped) {
     EXPECT_EQ("a\\x1b[31mb\tc\\x0a\\x7f\\x00",
               Escaped(std::string_view("a\x1b[31mb\tc\n\x7f\0", 12)));
     EXPECT_EQ("a\\x0d\nb", EscapedLines("a\r\nb"));
 }
 
-TEST(TextTest, WellFormedUTF8StaysAndTheRestIsEscaped) {
+TEST(EscapedTextTest, WellFormedUTF8StaysAndTheRestIsEscaped) {
     EXPECT_EQ("gr\xc3\xbc\xc3\x9f \xe2\x82\xac \xf0\x9f\x98\x80",
               Escaped("gr\xc3\xbc\xc3\x9f \xe2\x82\xac \xf0\x9f\x98\x80"));
     // A lone byte, a sequence cut short, an overlong one, a surrogate, a control of the C1 set.
@@ -29,17 +21,6 @@ TEST(TextTest, WellFormedUTF8StaysAndTheRestIsEscaped) {
     EXPECT_EQ("\\xc0\\xaf", Escaped("\xc0\xaf"));
     EXPECT_EQ("\\xed\\xa0\\x80", Escaped("\xed\xa0\x80"));
     EXPECT_EQ("\\xc2\\x9b", Escaped("\xc2\x9b"));
-}
-
-TEST(TextTest, CaseIsOnlyThatOfASCII) {
-    EXPECT_EQ("abc\xc3\x84", Lower("AbC\xc3\x84"));
-    EXPECT_TRUE(EqualNoCase("Auth", "aUTH"));
-    EXPECT_FALSE(EqualNoCase("auth", "auth "));
-}
-
-TEST(TextTest, OneThingIsCountedInTheSingular) {
-    EXPECT_EQ("1 file", Counted(1, "file"));
-    EXPECT_EQ("0 files", Counted(0, "file"));
 }
 
 } // namespace

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-#ifndef TSLAUTHCTL_DIRECTORY_H
-#define TSLAUTHCTL_DIRECTORY_H
+#ifndef TSLAUTHCTL_JOINEDDOMAIN_H
+#define TSLAUTHCTL_JOINEDDOMAIN_H
 
 #include "terminal/Await.h"
 #include "terminal/Console.h"
@@ -22,7 +22,7 @@ std::shared_ptr<authentication::ActiveDirectoryStore> OpenStore(Limit limit);
 /// what it leaves out. A process that has just begun has nothing in its cache, and an empty answer
 /// would look like that of a host that is in no domain.
 /// @throws Failure with what the store's constructor throws
-std::shared_ptr<authentication::ActiveDirectoryProvider> OpenProvider(Limit limit);
+std::shared_ptr<authentication::ActiveDirectoryProvider> OpenProvider();
 
 /// The domain that the host is joined to.
 /// @throws Failure, also where there is none (not joined) or the provider cannot tell (refused)

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "terminal/Text.h"
+#include "terminal/EscapedText.h"
 
 namespace tessel::tslauthctl {
 
@@ -57,55 +57,7 @@ std::string Escape(std::string_view text, bool keepLineFeeds) {
     return out;
 }
 
-char LowerChar(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
 } // namespace
-
-std::vector<std::string_view> Lines(std::string_view text) {
-    std::vector<std::string_view> lines;
-    while (!text.empty()) {
-        auto const end = text.find('\n');
-        auto const length = end == std::string_view::npos ? text.size() : end + 1;
-        lines.push_back(text.substr(0, length));
-        text.remove_prefix(length);
-    }
-    return lines;
-}
-
-bool IsSpace(char c) noexcept {
-    return c == ' ' || (c >= '\t' && c <= '\r');
-}
-
-bool IsBlank(std::string_view text) noexcept {
-    for (char const c : text) {
-        if (!IsSpace(c)) {
-            return false;
-        }
-    }
-    return true;
-}
-
-std::string Lower(std::string_view text) {
-    std::string lower(text);
-    for (char& c : lower) {
-        c = LowerChar(c);
-    }
-    return lower;
-}
-
-bool EqualNoCase(std::string_view left, std::string_view right) noexcept {
-    if (left.size() != right.size()) {
-        return false;
-    }
-    for (std::size_t i = 0; i < left.size(); ++i) {
-        if (LowerChar(left[i]) != LowerChar(right[i])) {
-            return false;
-        }
-    }
-    return true;
-}
 
 std::string Escaped(std::string_view text) {
     return Escape(text, false);
@@ -113,15 +65,6 @@ std::string Escaped(std::string_view text) {
 
 std::string EscapedLines(std::string_view text) {
     return Escape(text, true);
-}
-
-std::string Counted(std::size_t count, std::string_view noun) {
-    std::string text = std::to_string(count) + " ";
-    text += noun;
-    if (count != 1) {
-        text += 's';
-    }
-    return text;
 }
 
 } // namespace tessel::tslauthctl

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/PAMMeaning.h"
-
 #include <gmock/gmock.h>
 
-namespace tessel::tslauthctl {
+#include <meaning/PAMMeaning.h>
+
+namespace tessel::meaning {
 namespace {
 
 using testing::ElementsAre;
@@ -140,4 +140,4 @@ TEST(PAMMeaningTest, AnIncludeOfItselfEnds) {
 }
 
 } // namespace
-} // namespace tessel::tslauthctl
+} // namespace tessel::meaning

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#ifndef TSLAUTHCTL_PAMMEANING_H
-#define TSLAUTHCTL_PAMMEANING_H
+#pragma once
 
 #include <functional>
 #include <map>
@@ -18,7 +17,7 @@
 /// - a leading minus only keeps libpam from logging that the module is missing;
 /// - a facility that is not known makes every "auth" fail;
 /// - a line is read in pieces of 1023 bytes, and ends at a NUL byte.
-namespace tessel::tslauthctl {
+namespace tessel::meaning {
 
 struct PAMLine {
     /// In lower case; "@include", or as written where it is no facility.
@@ -46,6 +45,9 @@ struct PAMLine {
 /// The line in the form that libpam and the library read the same wherever there is one.
 std::string PAMText(PAMLine const& line);
 
+/// The entry of a text that follows a facility: control, module, arguments.
+PAMLine ReadPAMEntry(std::string const& facility, std::string const& entry);
+
 struct PAMMeaning {
     std::vector<PAMLine> lines;
     std::size_t comments = 0;
@@ -60,6 +62,10 @@ std::vector<PAMLine> PAMStackOf(PAMMeaning const& meaning, std::string const& fa
 
 /// The text of another policy by its name; nothing where it cannot be read.
 using PAMPolicyReader = std::function<std::optional<std::string>(std::string const&)>;
+
+/// Looks for policies by their names where libpam does.
+/// @param file gives the text of a file by its path; nothing where it cannot be read
+PAMPolicyReader PAMPoliciesIn(std::function<std::optional<std::string>(std::string const&)> file);
 
 inline constexpr char const* PAMFacilities[] = {"auth", "account", "password", "session"};
 
@@ -82,6 +88,4 @@ bool RunsAnything(std::vector<PAMLine> const& stack, PAMPolicyReader const& read
 /// The jumps of the lines themselves, and those out of what they include.
 std::vector<PAMJump> PAMJumps(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader);
 
-} // namespace tessel::tslauthctl
-
-#endif
+} // namespace tessel::meaning

@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/PAMMeaning.h"
+#include "PAMMeaning.h"
 
-#include "terminal/Text.h"
+#include <base/AsciiText.h>
 
 #include <algorithm>
 
-namespace tessel::tslauthctl {
+namespace tessel::meaning {
+
+using namespace base::AsciiText;
 
 namespace {
 
@@ -14,6 +16,9 @@ constexpr std::size_t bufferSize = 1024;
 
 /// The depth at which libpam gives up following includes.
 constexpr int deepestInclude = 16;
+
+/// Where libpam looks for a policy, in this order.
+constexpr char const* policyFolders[] = {"/etc/pam.d/", "/usr/lib/pam.d/"};
 
 constexpr std::string_view separators = " \n\t";
 
@@ -279,6 +284,11 @@ std::string PAMText(PAMLine const& line) {
     return text;
 }
 
+PAMLine ReadPAMEntry(std::string const& facility, std::string const& entry) {
+    auto meaning = ReadPAMMeaning(facility + "\t" + entry + "\n");
+    return meaning.lines.empty() ? PAMLine() : std::move(meaning.lines.front());
+}
+
 PAMMeaning ReadPAMMeaning(std::string_view text) {
     PAMMeaning meaning;
     LineSource source(text);
@@ -315,6 +325,20 @@ std::vector<PAMLine> PAMStackOf(PAMMeaning const& meaning, std::string const& fa
     return stack;
 }
 
+PAMPolicyReader PAMPoliciesIn(std::function<std::optional<std::string>(std::string const&)> file) {
+    return [file = std::move(file)](std::string const& name) -> std::optional<std::string> {
+        if (!name.empty() && name.front() == '/') {
+            return file(name);
+        }
+        for (auto const* const folder : policyFolders) {
+            if (auto text = file(folder + name)) {
+                return text;
+            }
+        }
+        return std::nullopt;
+    };
+}
+
 bool RunsAnything(std::vector<PAMLine> const& stack, PAMPolicyReader const& reader) {
     std::vector<Step> steps;
     Flatten(stack, reader, 0, std::nullopt, steps);
@@ -344,4 +368,4 @@ std::vector<PAMJump> PAMJumps(std::vector<PAMLine> const& stack, PAMPolicyReader
     return jumps;
 }
 
-} // namespace tessel::tslauthctl
+} // namespace tessel::meaning

@@ -1,24 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "analysis/Loss.h"
-
-#include "terminal/Text.h"
-
-#include <tslauth/systemconfiguration/PAMEntry.h>
+#include "Losses.h"
 
 #include <algorithm>
-#include <cstdlib>
-#include <cxxabi.h>
-#include <memory>
 #include <set>
-#include <sstream>
-#include <typeinfo>
 
-namespace tessel::tslauthctl {
+namespace tessel::meaning {
 
 namespace {
-
-using authentication::ProviderModules::EditedNSSConfiguration;
-using authentication::ProviderModules::EditedPAMPolicy;
 
 /// One service or entry: what it says, and what it is known by when it says something else.
 struct Item {
@@ -124,6 +112,28 @@ void CompareServices(std::string const& database, NSSServices const& before,
     Compare(database, "service", "services", ItemsOf(before), ItemsOf(after), losses);
 }
 
+/// Takes the intended edit out of the comparison: the entry out of the services that hold it, where
+/// an edit puts it or may take it from.
+void SetAside(Edit edit, NSSServices const& entry, NSSServices& was, NSSServices& is) {
+    NSSServices rest;
+    switch (edit) {
+    case Edit::insert:
+        // Equal services are not inserted again: then nothing is set aside.
+        if (!SameEffect(was, is) && Without(is, entry, 0, rest)) {
+            is = rest;
+        }
+        break;
+    case Edit::remove:
+        for (std::size_t place = 0; place < was.size(); ++place) {
+            if (Without(was, entry, place, rest)) {
+                was = rest;
+                break;
+            }
+        }
+        break;
+    }
+}
+
 /// The text of an entry without its facility, for people.
 std::string EntryText(PAMLine const& line) {
     auto plain = line;
@@ -181,55 +191,56 @@ void CompareJumps(std::string const& facility, std::vector<PAMLine> const& short
     }
 }
 
+void CompareStacks(std::string const& facility, std::vector<PAMLine> const& was,
+                   std::vector<PAMLine> const& is, Edit edit, PAMLine const& entry,
+                   PAMPolicyReader const& reader, std::vector<std::string>& losses) {
+    if (was == is) {
+        return;
+    }
+    auto const& shorter = edit == Edit::insert ? was : is;
+    auto const& longer = edit == Edit::insert ? is : was;
+    if (auto const place = PlaceOf(entry, shorter, longer)) {
+        CompareJumps(facility, shorter, longer, *place, reader, losses);
+        if (edit == Edit::insert && !RunsAnything(was, reader)) {
+            losses.push_back(facility + ": the policy 'other', which decides where there is no "
+                                        "entry, would no longer");
+        }
+        return;
+    }
+    auto oldItems = ItemsOf(was);
+    auto newItems = ItemsOf(is);
+    auto& more = edit == Edit::insert ? newItems : oldItems;
+    auto const& less = edit == Edit::insert ? oldItems : newItems;
+    auto const text = EntryText(entry);
+    auto const isEntry = [&](Item const& item) { return item.text == text; };
+    auto const extra = Missing(more, less);
+    if (std::any_of(extra.begin(), extra.end(), isEntry)) {
+        more.erase(std::find_if(more.begin(), more.end(), isEntry));
+    }
+    Compare(facility, "entry", "entries", oldItems, newItems, losses);
+}
+
 } // namespace
 
-NSSServices Meaning(SystemConfiguration::NSSService const& service) {
-    std::ostringstream text;
-    text << "passwd: " << service;
-    auto line = ReadNSSLine(text.str());
-    return line ? std::move(line->services) : NSSServices();
-}
-
-PAMLine Meaning(SystemConfiguration::PAMEntry const& entry, std::string const& facility) {
-    std::ostringstream text;
-    text << facility << '\t' << entry << '\n';
-    auto meaning = ReadPAMMeaning(text.str());
-    return meaning.lines.empty() ? PAMLine() : std::move(meaning.lines.front());
-}
-
-std::vector<std::string> NSSLosses(std::string_view before, std::string_view after, Edit edit,
-                                   SystemConfiguration::NSSService const& service) {
-    auto const old = ReadNSSMeaning(before);
-    auto const made = ReadNSSMeaning(after);
-    auto const inserted = Meaning(service);
+std::vector<std::string> NSSLosses(NSSMeaning const& before, NSSMeaning const& after, Edit edit,
+                                   NSSServices const& entry,
+                                   std::vector<std::string> const& editedDatabases) {
     std::set<std::string> databases;
-    for (auto const* meaning : {&old, &made}) {
-        for (auto const& entry : meaning->databases) {
-            databases.insert(entry.first);
+    for (auto const* meaning : {&before, &after}) {
+        for (auto const& line : meaning->databases) {
+            databases.insert(line.first);
         }
     }
     std::vector<std::string> losses;
     for (auto const& database : databases) {
-        auto const known = EffectiveNSSServices(old, database);
+        auto const known = EffectiveNSSServices(before, database);
         auto was = known.value_or(NSSServices());
-        auto is = EffectiveNSSServices(made, database).value_or(NSSServices());
-        if (database == "passwd" || database == "group" || database == "shadow") {
-            NSSServices rest;
-            if (edit == Edit::insert) {
-                // Equal services are not inserted again: then nothing is set aside.
-                if (!SameEffect(was, is) && Without(is, inserted, 0, rest)) {
-                    is = rest;
-                }
-            } else {
-                for (std::size_t place = 0; place < was.size(); ++place) {
-                    if (Without(was, inserted, place, rest)) {
-                        was = rest;
-                        break;
-                    }
-                }
-            }
+        auto is = EffectiveNSSServices(after, database).value_or(NSSServices());
+        if (std::find(editedDatabases.begin(), editedDatabases.end(), database) !=
+            editedDatabases.end()) {
+            SetAside(edit, entry, was, is);
         }
-        bool const byDefault = old.databases.count(database) == 0;
+        bool const byDefault = before.databases.count(database) == 0;
         if (byDefault && !known && is.empty()) {
             continue;
         }
@@ -238,72 +249,16 @@ std::vector<std::string> NSSLosses(std::string_view before, std::string_view aft
     return losses;
 }
 
-std::vector<std::string> PAMLosses(std::string_view before, std::string_view after, Edit edit,
-                                   SystemConfiguration::PAMEntry const& entry,
-                                   PAMPolicyReader const& reader) {
-    auto const old = ReadPAMMeaning(before);
-    auto const made = ReadPAMMeaning(after);
+std::vector<std::string> PAMLosses(PAMMeaning const& before, PAMMeaning const& after, Edit edit,
+                                   PAMLine const& entry, PAMPolicyReader const& reader) {
     std::vector<std::string> losses;
     for (auto const* facility : PAMFacilities) {
-        auto const was = PAMStackOf(old, facility);
-        auto const is = PAMStackOf(made, facility);
-        if (was == is) {
-            continue;
-        }
-        auto const& shorter = edit == Edit::insert ? was : is;
-        auto const& longer = edit == Edit::insert ? is : was;
-        auto const inserted = Meaning(entry, facility);
-        if (auto const place = PlaceOf(inserted, shorter, longer)) {
-            CompareJumps(facility, shorter, longer, *place, reader, losses);
-            if (edit == Edit::insert && !RunsAnything(was, reader)) {
-                losses.push_back(std::string(facility) +
-                                 ": the policy 'other', which decides where there is no entry, "
-                                 "would no longer");
-            }
-            continue;
-        }
-        auto oldItems = ItemsOf(was);
-        auto newItems = ItemsOf(is);
-        auto& more = edit == Edit::insert ? newItems : oldItems;
-        auto const& less = edit == Edit::insert ? oldItems : newItems;
-        auto const text = EntryText(inserted);
-        auto const extra = Missing(more, less);
-        if (std::any_of(extra.begin(), extra.end(),
-                        [&](Item const& item) { return item.text == text; })) {
-            more.erase(std::find_if(more.begin(), more.end(),
-                                    [&](Item const& item) { return item.text == text; }));
-        }
-        Compare(facility, "entry", "entries", oldItems, newItems, losses);
+        auto inserted = entry;
+        inserted.facility = facility;
+        CompareStacks(facility, PAMStackOf(before, facility), PAMStackOf(after, facility), edit,
+                      inserted, reader, losses);
     }
     return losses;
 }
 
-std::vector<std::string> NSSLossesOnReturn(std::string_view text,
-                                           SystemConfiguration::NSSService const& service) {
-    try {
-        return NSSLosses(text, EditedNSSConfiguration(text, Edit::remove, service), Edit::remove,
-                         service);
-    } catch (std::exception const& e) {
-        return {"the library would no longer read the file: " + std::string(e.what())};
-    }
-}
-
-std::vector<std::string> PAMLossesOnReturn(std::string_view text,
-                                           SystemConfiguration::PAMEntry const& entry,
-                                           PAMPolicyReader const& reader) {
-    try {
-        return PAMLosses(text, EditedPAMPolicy(text, Edit::remove, entry), Edit::remove, entry,
-                         reader);
-    } catch (std::exception const& e) {
-        return {"the library would no longer read the file: " + std::string(e.what())};
-    }
-}
-
-std::string ClassName(std::exception const& exception) {
-    int status = 0;
-    std::unique_ptr<char, decltype(&std::free)> const name(
-        abi::__cxa_demangle(typeid(exception).name(), nullptr, nullptr, &status), &std::free);
-    return status == 0 ? name.get() : typeid(exception).name();
-}
-
-} // namespace tessel::tslauthctl
+} // namespace tessel::meaning
