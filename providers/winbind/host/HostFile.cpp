@@ -122,6 +122,14 @@ void RemoveHostFile(std::string const& path) {
     }
 }
 
+void RemoveEmptyFolder(std::string const& path) {
+    // One that others use, or have mounted something on, stays.
+    if (::rmdir(path.c_str()) != 0 && errno != ENOTEMPTY && errno != EEXIST && errno != EBUSY &&
+        errno != ENOENT && errno != ENOTDIR) {
+        ThrowSystemFailure("cannot remove the folder '" + path + "'", errno);
+    }
+}
+
 HostChanges::~HostChanges() {
     (void)Undo(); // who wants to know calls it first
 }
@@ -179,8 +187,8 @@ bool HostChanges::MakeFolder(std::string const& path, mode_t mode) {
         }
         ThrowSystemFailure("cannot make the folder '" + path + "'", errno);
     }
-    _undo.emplace_back([path] { (void)::rmdir(path.c_str()); }); // stays where others use it
-    if (::chmod(path.c_str(), mode) != 0) {                      // whatever the host's umask is
+    _undo.emplace_back([path] { RemoveEmptyFolder(path); });
+    if (::chmod(path.c_str(), mode) != 0) { // whatever the host's umask is
         ThrowSystemFailure("cannot give '" + path + "' its mode", errno);
     }
     return true;

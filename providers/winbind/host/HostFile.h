@@ -30,6 +30,10 @@ bool FileExists(std::string const& path);
 /// @throws Failure
 void RemoveHostFile(std::string const& path);
 
+/// Removes a folder that nobody has put anything into, if there is one.
+/// @throws Failure
+void RemoveEmptyFolder(std::string const& path);
+
 /// Changes of the host that are taken back, in reverse order, unless they are kept. Taking back is
 /// done with what was set aside before, and needs no room on a disk.
 ///

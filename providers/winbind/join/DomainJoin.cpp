@@ -56,6 +56,7 @@ struct FreeHost {
 struct Partner {
     ControllerAnswer answer;
     std::string begin; ///< its time, as a directory writes it, just before the join
+    std::vector<std::string> preferred; ///< for the host's configuration
 };
 
 /// What the controller's half of a join has made.
@@ -124,14 +125,15 @@ FreeHost LookAtHost(Host const& host, Order const& order) {
 /// @param first asked before the preferred controllers; may be empty
 Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
                     std::string const& first, StagingFolder& staging) {
-    std::vector<std::string> preferred = PreferredControllers(host.At(Paths::State)).Read();
+    std::vector<std::string> const preferred = PreferredControllers(host.At(Paths::State)).Read();
+    std::vector<std::string> candidates = preferred;
     if (!first.empty()) {
-        preferred.insert(preferred.begin(), first);
+        candidates.insert(candidates.begin(), first);
     }
     staging.Configure(Guess(order), order.domain, {});
     SambaTools const tools(host, staging);
     auto const answer =
-        DomainDiscovery::FindController(host, tools, order.domain, preferred, order.deadline);
+        DomainDiscovery::FindController(host, tools, order.domain, candidates, order.deadline);
     DomainDiscovery::CheckHostName(host, order.computer, answer, order.domain);
     auto const ahead = DomainDiscovery::CheckClock(tools, answer.controller, order.deadline);
     staging.Configure({answer.Realm(), answer.netBIOSDomain, order.computer, {}}, order.domain,
@@ -140,7 +142,7 @@ Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
     if (!secrets.empty()) {
         staging.SetSecrets(secrets);
     }
-    return {answer, AccountUndo::Begin(ahead)};
+    return {answer, AccountUndo::Begin(ahead), preferred};
 }
 
 std::string SecretsIn(StagingFolder const& staging) {
@@ -228,20 +230,18 @@ void GiveUp(Host const& host, FreeHost const& free) {
 }
 
 /// Phase 4: the host.
-/// @param controllers for its configuration
 void TakeOver(Host const& host, Order const& order, FreeHost const& free, Partner const& partner,
-              Secrets const& secrets, std::vector<std::string> const& controllers,
-              SambaTools const& tools) {
+              Secrets const& secrets, SambaTools const& tools) {
     HostChanges changes;
     bool isDissolved = false;
     try {
         GiveUp(host, free);
         isDissolved = free.half.has_value();
-        LocalMembership::Establish(
-            host, free.folders,
-            {{partner.answer.Realm(), partner.answer.netBIOSDomain, order.computer, controllers},
-             order.domain},
-            secrets.database, changes, order.deadline);
+        LocalMembership::Establish(host, free.folders,
+                                   {{partner.answer.Realm(), partner.answer.netBIOSDomain,
+                                     order.computer, partner.preferred},
+                                    order.domain},
+                                   secrets.database, changes, order.deadline);
     } catch (Failure const& e) {
         ThrowUndone(order, partner, secrets, tools, changes,
                     isDissolved || e.Code() == TSLAUTH_WINBIND_HOST_CHANGED, e.Code(), e.what());
@@ -299,8 +299,7 @@ void WithCredentials(Host const& host, std::string const& domain, std::string co
     Partner const partner = FindPartner(host, order, free, "", staging);
     Secrets const secrets = MakeSecrets(host, order, partner, account, place, staging);
     SambaTools const tools(host, staging);
-    TakeOver(host, order, free, partner, secrets,
-             PreferredControllers(host.At(Paths::State)).Read(), tools);
+    TakeOver(host, order, free, partner, secrets, tools);
     if (!place.empty()) {
         TellOfUnit(order, partner, place, account, tools);
     }
@@ -325,14 +324,13 @@ void WithMachineAccount(Host const& host, ActiveDirectoryClientDomainInformation
     OperationLock const lock(host.At(Paths::Lock), order.deadline);
     FreeHost const free = LookAtHost(host, order);
     StagingFolder staging(host.At(Paths::Staging));
-    Partner const partner = FindPartner(host, order, free, controller, staging);
-    Secrets const secrets = MakeSecrets(host, order, blob, staging);
-    std::vector<std::string> controllers = PreferredControllers(host.At(Paths::State)).Read();
-    if (controllers.empty() && !controller.empty()) {
+    Partner partner = FindPartner(host, order, free, controller, staging);
+    if (partner.preferred.empty() && !controller.empty()) {
         // The others may not have heard of the account yet.
-        controllers.push_back(controller);
+        partner.preferred.push_back(controller);
     }
-    TakeOver(host, order, free, partner, secrets, controllers, SambaTools(host, staging));
+    Secrets const secrets = MakeSecrets(host, order, blob, staging);
+    TakeOver(host, order, free, partner, secrets, SambaTools(host, staging));
 }
 
 void RequireJoinable(Host const& host) {

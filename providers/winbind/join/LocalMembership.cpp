@@ -144,7 +144,7 @@ void RemoveKerberos(Host const& host, std::set<Made> const& made) {
     }
     RemoveHostFile(host.At(Paths::OwnKerberos));
     if (made.count(Made::KerberosFolder) != 0) {
-        (void)::rmdir(host.At(Paths::OwnKerberosFolder).c_str()); // stays where others use it
+        RemoveEmptyFolder(host.At(Paths::OwnKerberosFolder));
     }
 }
 
@@ -332,11 +332,11 @@ bool CleanUp(Host const& host, SambaFolders const& folders, Clock::time_point de
     if (!Membership::Read(host)) {
         RestoreOriginals(files);
     }
+    RemoveTemporaryFiles(files); // before a folder that one of them is in is to go
     // Again: the original of smb.conf may be that of a member.
     if (!Membership::Read(host)) {
         FinishParting(host, folders, deadline);
     }
-    RemoveTemporaryFiles(files);
     return ReadHostFile(host.At(Paths::Samba)).value_or("") != before;
 }
 

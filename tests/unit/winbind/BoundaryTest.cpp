@@ -30,7 +30,8 @@ TEST(BoundaryTest, AFailureIsItsCode) {
     EXPECT_EQ(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN,
               CodeOfThrowing(Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "none")));
     EXPECT_EQ(TSLAUTH_WINBIND_ACCOUNT_LEFT,
-              static_cast<ActiveDirectoryClientErrorCode>(CodeOfThrowing(Failure(TSLAUTH_WINBIND_ACCOUNT_LEFT, ""))));
+              static_cast<ActiveDirectoryClientErrorCode>(
+                  CodeOfThrowing(Failure(TSLAUTH_WINBIND_ACCOUNT_LEFT, ""))));
 }
 
 TEST(BoundaryTest, AFailureWithoutACodeIsNoSuccess) {

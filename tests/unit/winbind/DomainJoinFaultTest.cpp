@@ -29,6 +29,8 @@ void Tell(std::function<void()> const& operation) {
         operation();
     } catch (Failure const& e) {
         throw std::runtime_error(std::to_string(e.Code()) + ": " + e.what());
+    } catch (std::exception const& e) {
+        throw std::runtime_error(std::to_string(TSLAUTH_PROVIDER_INTERNAL_ERROR) + ": " + e.what());
     }
 }
 

@@ -2,6 +2,7 @@
 #include "host/HostFile.h"
 
 #include "../../TemporaryFolder.h"
+#include "../../faults/Faults.h"
 #include "Failure.h"
 
 #include <gmock/gmock.h>
@@ -144,6 +145,39 @@ TEST(HostFileTest, AMarkIsThereUntilTheChangesAreKeptOrTakenBack) {
         }
         EXPECT_TRUE(folder.Names().empty());
     }
+}
+
+TEST(HostFileTest, NoMarkAndNoOriginalComesBackWithAPowerLoss) {
+    if (!faults::Available()) {
+        GTEST_SKIP() << "this kernel has no seccomp notifications";
+    }
+    TemporaryFolder const folder;
+    SetContents(folder / "old", "old");
+    HostChanges changes;
+    changes.Mark(folder / "mark", "");
+    changes.Replace(folder / "old", "new", 0600);
+    auto const outcome = faults::Run(
+        [&] { changes.Keep(); }, [](std::size_t, std::string const&) { return faults::Happens(); });
+    // The mark's end is durable before the original's, and both before the changes are said to be kept.
+    EXPECT_THAT(outcome.calls, ElementsAre("unlink", "open", "fsync", "close", "unlink", "open",
+                                           "fsync", "close"));
+    changes.Keep();
+}
+
+TEST(HostFileTest, AFolderThatSomebodyUsesIsNotRemoved) {
+    TemporaryFolder const folder;
+    SetContents(folder / "file", "");
+    RemoveEmptyFolder(folder.Path());
+    RemoveEmptyFolder(folder / "none");
+    EXPECT_THAT(folder.Names(), ElementsAre("file"));
+}
+
+TEST(HostFileTest, AFullDiskHasItsCode) {
+    EXPECT_EQ(TSLAUTH_WINBIND_DISK_FULL, CodeOfSystem(ENOSPC));
+    EXPECT_EQ(TSLAUTH_WINBIND_DISK_FULL, CodeOfSystem(EDQUOT));
+    EXPECT_EQ(TSLAUTH_PROVIDER_ACCESS_DENIED, CodeOfSystem(EPERM));
+    EXPECT_EQ(TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY, CodeOfSystem(ENOMEM));
+    EXPECT_EQ(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, CodeOfSystem(EIO));
 }
 
 TEST(HostFileTest, ALinkToNothingIsNotReplaced) {

@@ -133,7 +133,7 @@ public:
         if (verdict == Verdict::TimedOut) {
             return {137, 9, true, ""};
         }
-        auto outcome = Play(task, command);
+        auto outcome = Played(task, command);
         if (verdict == Verdict::Killed) {
             return {137, 9, false, outcome.output};
         }
@@ -250,6 +250,16 @@ private:
 
     static bool Holds(std::string const& text, std::string const& part) {
         return text.find(part) != std::string::npos;
+    }
+
+    /// A program that cannot write fails.
+    Outcome Played(tessel::winbind::ChildProcess::Task const& task,
+                   std::string const& command) const {
+        try {
+            return Play(task, command);
+        } catch (std::runtime_error const& e) {
+            return {255, 0, false, e.what()};
+        }
     }
 
     Outcome Play(tessel::winbind::ChildProcess::Task const& task,
