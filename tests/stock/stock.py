@@ -34,7 +34,7 @@ class StockHost(Node):
 
     def command(self, *command):
         return ["nsenter", "--target", self.holder, "--mount", "--uts", "--ipc", "--net", "--pid",
-                "--root", "--wd=/", "--", "env", "DEBIAN_FRONTEND=noninteractive", *command]
+                "--root", "--wdns=/", "--", "env", "DEBIAN_FRONTEND=noninteractive", *command]
 
     # --- packages ---------------------------------------------------------------------------------
 
