@@ -13,6 +13,9 @@ else
     readonly bold='' red='' green='' cyan='' plain=''
 fi
 
+# What the program says of itself, at its top.
+help_text() { awk 'NR > 2 && !/^#/ {exit} NR > 2 {sub(/^# ?/, ""); print}' "$self"; }
+
 # Starts the program again through sudo where it is not root already.
 become_root() {
     ((EUID != 0)) || return 0

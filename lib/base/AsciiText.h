@@ -26,7 +26,8 @@ constexpr bool IsSpace(char c) {
 }
 
 constexpr bool IsControl(char c) {
-    return static_cast<unsigned char>(c) < ' ' || c == '\x7f'; // on some machines no char is below 0
+    // Whether a char can be below 0 is the machine's affair.
+    return static_cast<unsigned char>(c) < ' ' || c == '\x7f';
 }
 
 constexpr char Lower(char c) {

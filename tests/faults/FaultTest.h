@@ -10,8 +10,8 @@
 #include <sys/stat.h>
 #include <utility>
 
-/// A file to be replaced under faults. Each test asks the same two questions: is the file whole, and
-/// does the caller know?
+/// A file to be replaced under faults. Each test asks the same two questions: is the file whole,
+/// and does the caller know?
 class FaultTest : public testing::Test {
 protected:
     FaultTest(std::string const& name, std::string text)

@@ -2,7 +2,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """Compares what the library exports with the kept list and with the public headers.
 
-symbols.py LIBRARY LIST INCLUDE_FOLDER            prints each difference; exit code 1 if there is one
+symbols.py LIBRARY LIST INCLUDE_FOLDER       prints each difference; exit code 1 if there is one
 symbols.py LIBRARY LIST INCLUDE_FOLDER --write    makes the list anew, for a change on purpose"""
 
 import pathlib
@@ -92,7 +92,8 @@ def main():
             if not re.search(pattern, headers):
                 differences.append(f"no public header declares {word}: {symbol}")
     classes = re.findall(
-        r'\b(?:class|struct) __attribute__\(\(visibility\("default"\)\)\) (\w+)(?=[^;{]*\{)', headers
+        r'\b(?:class|struct) __attribute__\(\(visibility\("default"\)\)\) (\w+)(?=[^;{]*\{)',
+        headers
     )
     if len(classes) < 64:
         differences.append(f"only {len(classes)} exported classes found in the headers")

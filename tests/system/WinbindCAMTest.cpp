@@ -23,8 +23,8 @@
 #include <sys/wait.h>
 #include <thread>
 
-/// The CAM provider `winbind-cam` and its service, with real certificates and TLS between them. Samba's
-/// program is a stand-in: what a domain does with the blob is not looked at here.
+/// The CAM provider `winbind-cam` and its service, with real certificates and TLS between them.
+/// Samba's program is a stand-in: what a domain does with the blob is not looked at here.
 namespace tessel::authentication {
 namespace {
 
@@ -631,7 +631,8 @@ TEST_F(WinbindCAMTest, HostsThatAskAtOnceGetTheirOwn) {
         std::string const pin = ThumbprintOf("good");
         pid_t const process = fork();
         if (process == 0) {
-            // A host of its own, as far as the provider can tell. Nothing of the test's is run down.
+            // A host of its own, as far as the provider can tell. Nothing of the test's is run
+            // down.
             bool isRight = unshare(CLONE_NEWNS) == 0 &&
                            mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
                            mount("host", "/etc/tessel/tslauth", "tmpfs", 0, "mode=0755") == 0;

@@ -31,8 +31,8 @@ using testing::StartsWith;
 
 #if defined(__has_feature)
 #if __has_feature(address_sanitizer)
-// A program that ends while a thread of it hangs: the leak checker cannot always stop that thread, and
-// then misses what glibc keeps for it.
+// A program that ends while a thread of it hangs: the leak checker cannot always stop that thread,
+// and then misses what glibc keeps for it.
 extern "C" char const* __lsan_default_suppressions();
 extern "C" char const* __lsan_default_suppressions() {
     return "leak:_dlerror_run";
