@@ -1,8 +1,15 @@
 # SPDX-License-Identifier: Apache-2.0
-# Debian root file systems below build/roots, made once and kept. Sourced after common.sh, never run.
+# Debian root file systems below build/roots, made once and kept. Sourced after common.sh, never
+# run.
 
 readonly roots=$tree/build/roots
-readonly debian_mirror=${DEBIAN_MIRROR:-http://deb.debian.org/debian}
+
+# Where this machine's own Debian comes from. Nothing where apt does not know: debootstrap has a
+# default.
+debian_mirror() {
+    apt-get indextargets --format '$(REPO_URI)' 'Created-By: Packages' 'Label: Debian' |
+        sort -u | head -n 1
+}
 
 # suite_of RELEASE: the name of a Debian by its number.
 suite_of() {
@@ -13,8 +20,8 @@ suite_of() {
     esac
 }
 
-# debian_root NAME SUITE ARCHITECTURE PACKAGE...: a minimal system with these packages. Another list of
-# packages makes it anew.
+# debian_root NAME SUITE ARCHITECTURE PACKAGE...: a minimal system with these packages. Another list
+# of packages makes it anew.
 debian_root() {
     local folder=$roots/$1 suite=$2 architecture=$3 wanted="$*"
     shift 3
@@ -22,7 +29,7 @@ debian_root() {
     rm -rf "$folder" "$folder.made"
     mkdir -p "$folder" "$roots/archives/$suite"
     debootstrap --variant=minbase --arch="$architecture" --cache-dir="$roots/archives/$suite" \
-        "$suite" "$folder" "$debian_mirror" || return
+        "$suite" "$folder" $(debian_mirror) || return
     # debootstrap's own way of installing knows no order of dependencies.
     in_root "$folder" apt-get -q update &&
         with_archives "$suite" "$folder" apt-get -q -y -o Dpkg::Use-Pty=0 --no-install-recommends \
@@ -30,7 +37,8 @@ debian_root() {
     echo "$wanted" >"$folder.made"
 }
 
-# with_archives SUITE FOLDER COMMAND...: in the root, where apt keeps what it fetches for the next root.
+# with_archives SUITE FOLDER COMMAND...: in the root, where apt keeps what it fetches for the next
+# root.
 with_archives() {
     local suite=$1
     shift
@@ -38,8 +46,8 @@ with_archives() {
     BIND="${BIND-} $roots/archives/$suite:/var/cache/apt/archives" in_root "$@"
 }
 
-# in_root FOLDER COMMAND...: as root in it, with the machine's network and nothing else of it but the
-# folders that BIND names, each a word SOURCE:TARGET.
+# in_root FOLDER COMMAND...: as root in it, with the machine's network and nothing else of it but
+# the folders that BIND names, each a word SOURCE:TARGET.
 in_root() {
     local folder=$1
     shift
