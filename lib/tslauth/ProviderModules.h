@@ -23,13 +23,6 @@ inline constexpr SystemConfiguration::NSSDatabase::Database EditedDatabases[] = 
     SystemConfiguration::NSSDatabase::passwd, SystemConfiguration::NSSDatabase::group,
     SystemConfiguration::NSSDatabase::shadow};
 
-/// Where a provider's entry stands, and its service.
-inline constexpr SystemConfiguration::PAMFacility::Facility EditedFacilities[] = {
-    SystemConfiguration::PAMFacility::auth, SystemConfiguration::PAMFacility::account};
-inline constexpr SystemConfiguration::NSSDatabase::Database EditedDatabases[] = {
-    SystemConfiguration::NSSDatabase::passwd, SystemConfiguration::NSSDatabase::group,
-    SystemConfiguration::NSSDatabase::shadow};
-
 /// The entry for the PAM module of a provider: "sufficient", the module in the directory that the
 /// policy names, the parameters.
 SystemConfiguration::PAMEntry PAMEntryFor(std::string const& module,
