@@ -1,5 +1,6 @@
 # SPDX-License-Identifier: Apache-2.0
 """A stock Debian host for the statements: commands in it, log-ins as a person makes them, apt."""
+import json
 import os
 import subprocess
 import sys
@@ -14,6 +15,18 @@ STATE = os.environ.get("STOCK_STATE") or os.path.join(TREE, "build/stock")
 STOCK_HOST = os.path.join(TREE, "tools/stock-host")
 # Ours, in the order in which a person would name them.
 PACKAGES = ("tslauth", "tslauthctl", "tslauth-provider-winbind", "libtslauth1", "libstrandctl1")
+POLICY = "/etc/pam.d/system-auth-generic"
+# What `tslauthctl setup` does, for a tool that has no such command yet.
+BY_HAND = """
+    mkdir -p /etc/tessel/tslauth
+    echo 'remote-authentication-store = "None"' >/etc/tessel/tslauth/authentication.conf
+    echo 'provider = "winbind"' >/etc/tessel/tslauth/provider.conf
+    echo '+:ALL:ALL' >/etc/tessel/tslauth/access.conf
+    /usr/libexec/tslauth/keep-policy create
+    pam-auth-update --disable winbind
+    pam-auth-update --enable tslauth tslauth-password
+    tslauthctl prepare --write || [ $? = 7 ]
+    """
 SSH_OPTIONS = ("-o", "StrictHostKeyChecking=no", "-o", "UserKnownHostsFile=/dev/null",
                "-o", "LogLevel=ERROR", "-o", "ConnectTimeout=20", "-o", "NumberOfPasswordPrompts=1")
 
@@ -27,6 +40,12 @@ class StockHost(Node):
         subprocess.run([STOCK_HOST, "up", "--release", str(release), name], check=True,
                        stdout=sys.stderr)
         with open(f"{STATE}/{name}/pid", encoding="ascii") as file:
+            self.holder = file.read().strip()
+
+    def reboot(self):
+        """Starts again, as after `systemctl reboot`."""
+        subprocess.run([STOCK_HOST, "reboot", self.name], check=True)
+        with open(f"{STATE}/{self.name}/pid", encoding="ascii") as file:
             self.holder = file.read().strip()
 
     def down(self):
@@ -105,7 +124,7 @@ class StockHost(Node):
         seen = ""
         answers = list(answers)
         while True:
-            found = terminal.expect([wanted, r"(?i)password: ?$", pexpect.EOF, pexpect.TIMEOUT,
+            found = terminal.expect([wanted, r"(?i)password( for \S+)?: ?$", pexpect.EOF, pexpect.TIMEOUT,
                                      r"login: ?$"])
             seen += terminal.before or ""
             if found in (2, 3, 4):
@@ -177,9 +196,37 @@ class StockHost(Node):
         found = [line for line in self.run("dpkg", "--verify", timeout=120).out.splitlines()]
         expect(not found, "dpkg --verify: " + "\n".join(found))
 
+    # --- set up -----------------------------------------------------------------------------------
+
     def set_up(self):
         """Ready for the first activation."""
-        self.tslauthctl("setup", "--provider", "winbind")
+        if self.run("tslauthctl", "setup", "--help").code == 0:
+            self.tslauthctl("setup", "--provider", "winbind")
+        else:
+            self.shell(BY_HAND)
 
-    def has_setup(self):
-        return self.run("tslauthctl", "setup", "--help").code == 0
+    def follows(self):
+        """The services ask the policy, and Debian's own winbind profile is off."""
+        for kind in ("auth", "account", "password", "session", "session-noninteractive"):
+            text = self.read(f"/etc/pam.d/common-{kind}")
+            expect("substack\tsystem-auth-generic" in text, f"common-{kind} does not follow:\n{text}")
+            expect("pam_winbind" not in text, f"Debian's winbind profile is on:\n{text}")
+        expect(self.read(POLICY) != "", "the policy is empty")
+
+    def follows_no_longer(self):
+        for kind in ("auth", "account", "password", "session", "session-noninteractive"):
+            text = self.read(f"/etc/pam.d/common-{kind}")
+            expect("system-auth-generic" not in text, f"common-{kind} follows:\n{text}")
+
+    def activate(self, store="Active Directory"):
+        self.tslauthctl("activate", store)
+
+    def store(self):
+        """What is recorded; None where nothing is."""
+        result = self.run("tslauthctl", "--json", "status")
+        return json.loads(result.out).get("store") if result.out else None
+
+    def is_active(self):
+        """The provider's entries are in the policy and in the name-service switch."""
+        return ("pam_tslauth_winbind.so" in self.read(POLICY)
+                and "tslauth_winbind" in self.read("/etc/nsswitch.conf"))
