@@ -23,6 +23,10 @@ BY_HAND = """
     echo 'provider = "winbind"' >/etc/tessel/tslauth/provider.conf
     echo '+:ALL:ALL' >/etc/tessel/tslauth/access.conf
     /usr/libexec/tslauth/keep-policy create
+    grep -q check_only /etc/pam.d/system-auth-generic || sed -i '
+        0,/^account/ s/^account/account\\trequired\\tpam_tslauth_winbind.so\\tcheck_only\\n&/
+        0,/^password/ s/^password/password\\tsufficient\\tpam_tslauth_winbind.so\\ttry_first_pass\\n&/
+        ' /etc/pam.d/system-auth-generic
     pam-auth-update --disable winbind
     pam-auth-update --enable tslauth tslauth-password
     tslauthctl prepare --write || [ $? = 7 ]
@@ -143,7 +147,7 @@ class StockHost(Node):
             terminal.close(force=True)
             return False, terminal.before
         terminal.sendline(password)
-        found = terminal.expect([r"[#$] ?$", "incorrect", "login: ", pexpect.EOF, pexpect.TIMEOUT,
+        found = terminal.expect([r"[#$] ?$", "incorrect", pexpect.EOF, pexpect.TIMEOUT,
                                  "Permission denied"])
         seen = terminal.before or ""
         terminal.close(force=True)
