@@ -34,10 +34,9 @@ void ReadAssignments(std::string_view text, std::map<std::string, std::string>& 
     auto const byKey = [](Assignment const& left, Assignment const& right) {
         return left.key < right.key;
     };
-    // Each then goes to the end of the map, which is several times faster for a large file than
-    // looking for its place. A file of ours is in order.
+    // A file of ours is in order already.
     if (!std::is_sorted(assignments.begin(), assignments.end(), byKey)) {
-        std::stable_sort(assignments.begin(), assignments.end(), byKey); // the first of a key wins
+        std::stable_sort(assignments.begin(), assignments.end(), byKey); // the first of a key stays
     }
     for (Assignment const& assignment : assignments) {
         map.emplace_hint(map.end(), assignment.key, assignment.value);

@@ -21,7 +21,7 @@ namespace {
 template <typename Work> int InChild(Work work) {
     pid_t const child = fork();
     if (child == 0) {
-        alarm(10);
+        alarm(30);
         _exit(work());
     }
     int status = 0;

@@ -10,6 +10,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <dlfcn.h>
+#include <iterator>
 #include <memory>
 #include <new>
 #include <string>
