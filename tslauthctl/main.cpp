@@ -45,6 +45,9 @@ struct Arguments {
     std::string store;
     bool acceptLoss = false;
     bool write = false;
+    std::string provider;
+    AccessArguments access;
+    bool list = false;
     JoinArguments join;
     /// Of a domain or of a user.
     std::string name;
@@ -75,9 +78,8 @@ public:
 
         auto* plan = Add("plan", "Show what 'activate' would write, and change nothing", arguments,
                          [&](Console& console) { return RunPlan(arguments.store, console); });
-        plan->add_option("store", arguments.store, "Display name of a store")
-            ->required()
-            ->type_name("NAME");
+        plan->add_option("store", arguments.store, "Display name of a store")->type_name("NAME");
+        plan->require_subcommand(0, 1);
 
         auto* activate =
             Add("activate", "Make a store the active one", arguments, [&](Console& console) {
@@ -98,6 +100,8 @@ public:
         prepare->add_flag("--accept-loss", arguments.acceptLoss,
                           "Also edit lines that cannot keep their whole meaning");
 
+        AddSetup(*plan, arguments);
+        AddAccess(*plan, arguments);
         AddMembership(arguments);
         AddQuestions(arguments);
         AddCAM(arguments);
@@ -153,6 +157,56 @@ private:
             }
         }
         return {};
+    }
+
+    void AddSetup(CLI::App& plan, Arguments& arguments) {
+        auto* setup = Add("setup", "Make the host ready for a provider", arguments,
+                          [&](Console& console) { return RunSetup(arguments.provider, console); });
+        auto* preview =
+            Add(plan, "setup", "Show what 'setup' would write", arguments,
+                [&](Console& console) { return RunPlanSetup(arguments.provider, console); });
+        for (auto* command : {setup, preview}) {
+            command->add_option("--provider", arguments.provider, "The provider's name")
+                ->required()
+                ->check(NotEmpty)
+                ->type_name("NAME");
+        }
+        Add("unsetup", "Make the host what it was before 'setup'", arguments, RunUnsetup);
+        Add(plan, "unsetup", "Show what 'unsetup' would write", arguments, RunPlanUnsetup);
+    }
+
+    void AddAccess(CLI::App& plan, Arguments& arguments) {
+        auto const add = [&](CLI::App& parent, bool denies, bool writes) {
+            auto* command = AddAsking(
+                parent, denies ? "deny" : "permit",
+                denies ? "Let users or groups of the domain no longer log in"
+                       : "Let users or groups of the domain log in",
+                arguments, [&arguments, denies, writes](Console& console) {
+                    if (arguments.list) {
+                        return RunListAccess(console);
+                    }
+                    arguments.access.denies = denies;
+                    return writes ? RunAccess(arguments.access, arguments.limit, console)
+                                  : RunPlanAccess(arguments.access, arguments.limit, console);
+                });
+            command->add_option("names", arguments.access.names, "Users and groups")
+                ->check(NotEmpty)
+                ->type_name("NAME");
+            command->add_flag("--force", arguments.access.force, "Also names that are not known");
+            return command;
+        };
+        for (bool const writes : {true, false}) {
+            auto& parent = writes ? _app : plan;
+            auto* permit = add(parent, false, writes);
+            permit->add_flag("--all", arguments.access.all, "Everybody of the host's domain");
+            permit->add_flag("--trusted", arguments.access.trusted,
+                             "With --all: and of the domains that it trusts");
+            add(parent, true, writes)
+                ->add_flag("--all", arguments.access.all, "Take back every permission");
+            if (writes) {
+                permit->add_flag("--list", arguments.list, "List who may log in");
+            }
+        }
     }
 
     void AddMembership(Arguments& arguments) {

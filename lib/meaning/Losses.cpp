@@ -112,6 +112,27 @@ void CompareServices(std::string const& database, NSSServices const& before,
     Compare(database, "service", "services", ItemsOf(before), ItemsOf(after), losses);
 }
 
+/// Takes `entry` out where it stands first.
+/// @return whether it was there
+bool RemoveFirst(NSSServices const& entry, NSSServices& services) {
+    NSSServices rest;
+    for (std::size_t place = 0; place < services.size(); ++place) {
+        if (Without(services, entry, place, rest)) {
+            services = rest;
+            return true;
+        }
+    }
+    return false;
+}
+
+std::size_t Copies(NSSServices services, NSSServices const& entry) {
+    std::size_t copies = 0;
+    while (!entry.empty() && RemoveFirst(entry, services)) {
+        ++copies;
+    }
+    return copies;
+}
+
 /// Takes the intended edit out of the comparison: the entry out of the services that hold it, where
 /// an edit puts it or may take it from.
 void SetAside(Edit edit, NSSServices const& entry, NSSServices& was, NSSServices& is) {
@@ -124,11 +145,10 @@ void SetAside(Edit edit, NSSServices const& entry, NSSServices& was, NSSServices
         }
         break;
     case Edit::remove:
-        for (std::size_t place = 0; place < was.size(); ++place) {
-            if (Without(was, entry, place, rest)) {
-                was = rest;
-                break;
-            }
+        // One copy or all of them: those that are gone were meant to go.
+        for (auto gone = Copies(was, entry) - std::min(Copies(was, entry), Copies(is, entry));
+             gone > 0; --gone) {
+            RemoveFirst(entry, was);
         }
         break;
     }
@@ -191,11 +211,25 @@ void CompareJumps(std::string const& facility, std::vector<PAMLine> const& short
     }
 }
 
-void CompareStacks(std::string const& facility, std::vector<PAMLine> const& was,
+/// Where an edit has taken out several copies of an entry: leaves one of them in `was`.
+void SetFurtherCopiesAside(PAMLine const& entry, std::vector<PAMLine> const& is,
+                           std::vector<PAMLine>& was) {
+    auto const copies = [&](std::vector<PAMLine> const& stack) {
+        return std::count(stack.begin(), stack.end(), entry);
+    };
+    for (auto gone = copies(was) - copies(is); gone > 1; --gone) {
+        was.erase(std::find(was.rbegin(), was.rend(), entry).base() - 1);
+    }
+}
+
+void CompareStacks(std::string const& facility, std::vector<PAMLine> was,
                    std::vector<PAMLine> const& is, Edit edit, PAMLine const& entry,
                    PAMPolicyReader const& reader, std::vector<std::string>& losses) {
     if (was == is) {
         return;
+    }
+    if (edit == Edit::remove) {
+        SetFurtherCopiesAside(entry, is, was);
     }
     auto const& shorter = edit == Edit::insert ? was : is;
     auto const& longer = edit == Edit::insert ? is : was;

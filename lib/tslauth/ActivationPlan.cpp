@@ -4,6 +4,8 @@
 #include "ConfigurationText.h"
 #include "ProviderModules.h"
 #include "SystemFile.h"
+#include "lossless/LosslessNSSConfiguration.h"
+#include "lossless/LosslessPAMPolicy.h"
 #include <tslauth/Paths.h>
 
 #include <tslauth/ActiveDirectoryProvider.h>
@@ -13,6 +15,7 @@
 #include <tslauth/Exceptions.h>
 
 #include <base/AsciiText.h>
+#include <base/WholeFile.h>
 #include <boost/make_shared.hpp>
 #include <meaning/Losses.h>
 
@@ -131,11 +134,55 @@ RemoteAuthenticationStore& RemoteStore(AuthenticationStore* store, std::string c
     return *remote;
 }
 
+std::string Edited(EditForm form, std::string const& text, Edit edit,
+                   SystemConfiguration::PAMEntry const& entry) {
+    switch (form) {
+    case EditForm::Normalised:
+        break;
+    case EditForm::Lossless:
+        return ProviderModules::LosslessPAMPolicy(text, edit, entry);
+    }
+    return ProviderModules::EditedPAMPolicy(text, edit, entry);
+}
+
+std::string Edited(EditForm form, std::string const& text, Edit edit,
+                   SystemConfiguration::NSSService const& service) {
+    switch (form) {
+    case EditForm::Normalised:
+        break;
+    case EditForm::Lossless:
+        return ProviderModules::LosslessNSSConfiguration(text, edit, service);
+    }
+    return ProviderModules::EditedNSSConfiguration(text, edit, service);
+}
+
+/// Edits one of the two system files. The form in which the stores do it writes a file also where
+/// that changes nothing, and what the stream they write through keeps of it.
+template <typename Item>
+void EditFile(EditForm form, char const* path, Edit edit, Item const& item) {
+    auto const text = ReadFile(path);
+    auto const edited = Edited(form, text, edit, item);
+    switch (form) {
+    case EditForm::Normalised:
+        ReplaceFile(path, edited);
+        break;
+    case EditForm::Lossless:
+        try {
+            if (edited != text) {
+                base::ReplaceFile(path, edited);
+            }
+        } catch (base::FileError const& failure) {
+            throw IOError(failure.what());
+        }
+        break;
+    }
+}
+
 /// Edits the PAM policy.
 class PolicyStep : public ActivationStep {
 public:
-    PolicyStep(Edit edit, SystemConfiguration::PAMEntry entry)
-        : _edit(edit), _entry(std::move(entry)) {}
+    PolicyStep(EditForm form, Edit edit, SystemConfiguration::PAMEntry entry)
+        : _form(form), _edit(edit), _entry(std::move(entry)) {}
 
     char const* Path() const override {
         return Paths::PAMPolicy;
@@ -146,7 +193,7 @@ public:
         PlannedFile file;
         file.path = Path();
         file.before = read(file.path);
-        file.after = ProviderModules::EditedPAMPolicy(file.before, _edit, _entry);
+        file.after = Edited(_form, file.before, _edit, _entry);
         auto const reader = Policies(read);
         auto const entry = ProviderModules::Meaning(_entry, PAMFacilities[0]);
         auto const was = ReadPAMMeaning(file.before);
@@ -154,8 +201,7 @@ public:
         file.losses = PAMLosses(was, is, _edit, entry, reader);
         if (_edit == Edit::insert) {
             auto const onReturn = [&] {
-                auto const left =
-                    ProviderModules::EditedPAMPolicy(file.after, Edit::remove, _entry);
+                auto const left = Edited(_form, file.after, Edit::remove, _entry);
                 return PAMLosses(is, ReadPAMMeaning(left), Edit::remove, entry, reader);
             };
             AddLossesOnReturn(onReturn, file);
@@ -169,11 +215,11 @@ public:
     }
 
     void Execute(AuthenticationConfiguration* /*record*/) const override {
-        ReplaceFile(Paths::PAMPolicy,
-                    ProviderModules::EditedPAMPolicy(ReadFile(Paths::PAMPolicy), _edit, _entry));
+        EditFile(_form, Path(), _edit, _entry);
     }
 
 private:
+    EditForm _form;
     Edit _edit;
     SystemConfiguration::PAMEntry _entry;
 };
@@ -181,8 +227,8 @@ private:
 /// Edits the name-service switch.
 class SwitchStep : public ActivationStep {
 public:
-    SwitchStep(Edit edit, SystemConfiguration::NSSService service)
-        : _edit(edit), _service(std::move(service)) {}
+    SwitchStep(EditForm form, Edit edit, SystemConfiguration::NSSService service)
+        : _form(form), _edit(edit), _service(std::move(service)) {}
 
     char const* Path() const override {
         return Paths::NSSConfiguration;
@@ -193,7 +239,7 @@ public:
         PlannedFile file;
         file.path = Path();
         file.before = read(file.path);
-        file.after = ProviderModules::EditedNSSConfiguration(file.before, _edit, _service);
+        file.after = Edited(_form, file.before, _edit, _service);
         auto const entry = ProviderModules::Meaning(_service);
         auto const was = ReadNSSMeaning(file.before);
         auto const is = ReadNSSMeaning(file.after);
@@ -201,8 +247,7 @@ public:
         file.losses = NSSLosses(was, is, _edit, entry, databases);
         if (_edit == Edit::insert) {
             auto const onReturn = [&] {
-                auto const left =
-                    ProviderModules::EditedNSSConfiguration(file.after, Edit::remove, _service);
+                auto const left = Edited(_form, file.after, Edit::remove, _service);
                 return NSSLosses(is, ReadNSSMeaning(left), Edit::remove, entry, databases);
             };
             AddLossesOnReturn(onReturn, file);
@@ -217,12 +262,11 @@ public:
     }
 
     void Execute(AuthenticationConfiguration* /*record*/) const override {
-        ReplaceFile(Paths::NSSConfiguration,
-                    ProviderModules::EditedNSSConfiguration(ReadFile(Paths::NSSConfiguration),
-                                                            _edit, _service));
+        EditFile(_form, Path(), _edit, _service);
     }
 
 private:
+    EditForm _form;
     Edit _edit;
     SystemConfiguration::NSSService _service;
 };
@@ -271,7 +315,7 @@ private:
 /// Makes another store inactive.
 class WithdrawalStep : public ActivationStep {
 public:
-    explicit WithdrawalStep(std::string store) : _store(std::move(store)) {}
+    WithdrawalStep(EditForm form, std::string store) : _form(form), _store(std::move(store)) {}
 
     char const* Path() const override {
         return nullptr;
@@ -285,7 +329,7 @@ public:
         if (!ours) {
             return;
         }
-        auto preview = ours->GetWithdrawalPlan().Preview(read);
+        auto preview = ours->GetWithdrawalPlan(_form).Preview(read);
         std::move(preview.files.begin(), preview.files.end(), std::back_inserter(files));
         if (preview.refusal) {
             std::rethrow_exception(preview.refusal);
@@ -294,10 +338,17 @@ public:
 
     void Execute(AuthenticationConfiguration* /*record*/) const override {
         std::auto_ptr<AuthenticationStore> const store = CreateStore(_store);
-        RemoteStore(store.get(), _store).MakeInactive();
+        auto& remote = RemoteStore(store.get(), _store);
+        auto const* const ours = dynamic_cast<ActiveDirectoryStore const*>(&remote);
+        if (ours && _form != EditForm::Normalised) {
+            ours->GetWithdrawalPlan(_form).Execute();
+        } else {
+            remote.MakeInactive();
+        }
     }
 
 private:
+    EditForm _form;
     std::string _store;
 };
 
@@ -348,25 +399,26 @@ ActivationPlan& ActivationPlan::operator=(ActivationPlan const& other) = default
 ActivationPlan::~ActivationPlan() = default;
 
 ActivationPlan ActivationPlan::Activating(ProviderEntries const& entries, std::string const& store,
-                                          EditForm /*form*/) {
+                                          EditForm form) {
     ActivationPlan plan;
-    plan._steps = {boost::make_shared<PolicyStep>(Edit::insert, entries.pam),
-                   boost::make_shared<SwitchStep>(Edit::insert, entries.nss),
+    plan._steps = {boost::make_shared<PolicyStep>(form, Edit::insert, entries.pam),
+                   boost::make_shared<SwitchStep>(form, Edit::insert, entries.nss),
                    boost::make_shared<RecordStep>(store)};
     return plan;
 }
 
-ActivationPlan ActivationPlan::Withdrawing(ProviderEntries const& entries, EditForm /*form*/) {
+ActivationPlan ActivationPlan::Withdrawing(ProviderEntries const& entries, EditForm form) {
     ActivationPlan plan;
-    plan._steps = {boost::make_shared<PolicyStep>(Edit::remove, entries.pam),
-                   boost::make_shared<SwitchStep>(Edit::remove, entries.nss)};
+    plan._steps = {boost::make_shared<PolicyStep>(form, Edit::remove, entries.pam),
+                   boost::make_shared<SwitchStep>(form, Edit::remove, entries.nss)};
     return plan;
 }
 
-ActivationPlan ActivationPlan::Replacing(std::string const& previous, std::string const& store) {
+ActivationPlan ActivationPlan::Replacing(std::string const& previous, std::string const& store,
+                                         EditForm form) {
     ActivationPlan plan;
     plan._steps = {boost::make_shared<RecordStep>(store),
-                   boost::make_shared<WithdrawalStep>(previous)};
+                   boost::make_shared<WithdrawalStep>(form, previous)};
     return plan;
 }
 

@@ -27,22 +27,22 @@ std::string NoRemoteAuthenticationStore::GetDisplayName() const {
     return DisplayName;
 }
 
-ActivationPlan
-NoRemoteAuthenticationStore::PlanFor(AuthenticationConfiguration const& record) const {
+ActivationPlan NoRemoteAuthenticationStore::PlanFor(AuthenticationConfiguration const& record,
+                                                    EditForm form) const {
     std::string const previous = record[Paths::RemoteAuthenticationStoreKey];
     // Recorded first, not last: a store that cannot be withdrawn would otherwise keep the host from
     // ever becoming local again. And not as what a derived class calls itself: it is local.
     return previous == GetDisplayName() ? ActivationPlan()
-                                        : ActivationPlan::Replacing(previous, DisplayName);
+                                        : ActivationPlan::Replacing(previous, DisplayName, form);
 }
 
-ActivationPlan NoRemoteAuthenticationStore::GetActivationPlan() const {
-    return PlanFor(AuthenticationConfiguration());
+ActivationPlan NoRemoteAuthenticationStore::GetActivationPlan(EditForm form) const {
+    return PlanFor(AuthenticationConfiguration(), form);
 }
 
 void NoRemoteAuthenticationStore::MakeActive() {
     AuthenticationConfiguration record;
-    PlanFor(record).Execute(record);
+    PlanFor(record, EditForm::Normalised).Execute(record);
 }
 
 NoRemoteAuthenticationStore::~NoRemoteAuthenticationStore() = default;

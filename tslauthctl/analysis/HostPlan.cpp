@@ -18,11 +18,11 @@ using namespace authentication;
 
 ActivationPlan PlanFor(HostPlan& plan) {
     if (plan.store == NoStore) {
-        return NoRemoteAuthenticationStore().GetActivationPlan();
+        return NoRemoteAuthenticationStore().GetActivationPlan(EditForm::Lossless);
     }
     ActiveDirectoryStore const store(0);
     plan.warnings = MissingModules(store.GetProviderEntries());
-    return store.GetActivationPlan();
+    return store.GetActivationPlan(EditForm::Lossless);
 }
 
 } // namespace
@@ -31,9 +31,9 @@ HostPlan MakeHostPlan(std::string const& store) {
     HostPlan plan;
     plan.store = store;
     try {
-        auto const steps = PlanFor(plan);
+        plan.steps = PlanFor(plan);
         plan.recorded = RecordedStore();
-        plan.preview = steps.Preview();
+        plan.preview = plan.steps.Preview();
         if (plan.preview.refusal) {
             std::rethrow_exception(plan.preview.refusal);
         }

@@ -17,6 +17,8 @@ struct HostPlan {
     std::string store;
     /// Nothing where it cannot be read.
     std::optional<std::string> recorded;
+    /// What is executed: the form that changes only the lines concerned.
+    authentication::ActivationPlan steps;
     authentication::ActivationPreview preview;
     /// What keeps the store from working although nothing would be lost.
     std::vector<std::string> warnings;

@@ -26,17 +26,6 @@ bool IsMissing(std::string const& path) {
     return access(path.c_str(), F_OK) != 0;
 }
 
-bool IsMissingPAMModule(std::string const& module) {
-    std::vector<std::string> candidates = {module};
-    std::string const isa = "$ISA";
-    if (auto const at = module.find(isa); at != std::string::npos) {
-        for (auto const* const directory : PAMModuleDirectories) {
-            candidates.push_back(std::string(module).replace(at, isa.size(), directory));
-        }
-    }
-    return std::all_of(candidates.begin(), candidates.end(), IsMissing);
-}
-
 bool IsIn(std::string const& directories, std::string const& file) {
     glob_t matches = {};
     bool const found = glob((directories + file).c_str(), GLOB_NOSORT, nullptr, &matches) == 0;
@@ -58,6 +47,17 @@ std::string ProviderName() {
         // Loading the provider tells why.
         return {};
     }
+}
+
+bool IsMissingPAMModule(std::string const& module) {
+    std::vector<std::string> candidates = {module};
+    std::string const isa = "$ISA";
+    if (auto const at = module.find(isa); at != std::string::npos) {
+        for (auto const* const directory : PAMModuleDirectories) {
+            candidates.push_back(std::string(module).replace(at, isa.size(), directory));
+        }
+    }
+    return std::all_of(candidates.begin(), candidates.end(), IsMissing);
 }
 
 std::vector<std::string> MissingModules(ProviderEntries const& entries) {

@@ -3,9 +3,9 @@
 
 #include "access/AccessRules.h"
 #include "setup/SetupPaths.h"
+#include "terminal/Console.h"
 
 #include <base/KeyValueText.h>
-#include <meaning/PAMMeaning.h>
 #include <tslauth/ActivationPlan.h>
 
 #include <algorithm>
@@ -70,7 +70,7 @@ bool Has(std::vector<PAMLine> const& stack, PAMLine const& sought) {
 }
 
 /// Whether the file of the access rules decides in this stack.
-bool AsksAccessRules(std::vector<PAMLine> const& stack) {
+bool StackAsksAccessRules(std::vector<PAMLine> const& stack) {
     std::string const module = std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule;
     std::string const file = std::string("accessfile=") + Paths::AccessRules;
     return std::any_of(stack.begin(), stack.end(), [&](PAMLine const& line) {
@@ -91,11 +91,6 @@ bool IncludesServicePolicy(PAMMeaning const& meaning) {
 /// Whether a policy does what the default one does for this provider, whatever else it does.
 bool Serves(std::string const& policy, SetupFacts const& facts) {
     auto const meaning = ReadPAMMeaning(policy);
-    for (auto const* const facility : {"auth", "account"}) {
-        if (!AsksAccessRules(PAMStackOf(meaning, facility))) {
-            return false;
-        }
-    }
     for (auto const& text : facts.asked.policyLines) {
         auto const asked = ReadPAMMeaning(text + "\n");
         for (auto const& line : asked.lines) {
@@ -104,7 +99,7 @@ bool Serves(std::string const& policy, SetupFacts const& facts) {
             }
         }
     }
-    return !IncludesServicePolicy(meaning) && !meaning.unreadable;
+    return AsksAccessRules(meaning) && !IncludesServicePolicy(meaning) && !meaning.unreadable;
 }
 
 bool IsActive(SetupFacts const& facts) {
@@ -115,9 +110,10 @@ bool IsActive(SetupFacts const& facts) {
 
 void RequireInactive(std::string const& path, SetupFacts const& facts) {
     if (IsActive(facts)) {
-        throw SetupRefusal("'" + path +
-                           "' has to be replaced, which takes the entries of the active "
-                           "store with it: activate 'None' first");
+        throw Failure(ExitCode::refused,
+                      "'" + path +
+                          "' has to be replaced, which takes the entries of the active "
+                          "store with it: activate 'None' first");
     }
 }
 
@@ -158,8 +154,8 @@ FileChange PlanNSS(std::string const& text, std::string const& service) {
     using namespace authentication;
     auto const withdrawal =
         ActivationPlan::Withdrawing(MakeProviderEntries({}, {}, service, {}), EditForm::Lossless);
-    auto const file = withdrawal.PreviewOf(Paths::NSSConfiguration,
-                                           [&](std::string const&) { return text; });
+    auto const file =
+        withdrawal.PreviewOf(Paths::NSSConfiguration, [&](std::string const&) { return text; });
     return {Paths::NSSConfiguration, text, file.after};
 }
 
@@ -198,7 +194,7 @@ void PlanServices(SetupFacts const& facts, SetupPlan& plan) {
         return;
     }
     plan.profilesOn = facts.profiles;
-    if (!facts.asked.replacedProfile.empty()) {
+    if (replaced && !facts.asked.replacedProfile.empty()) {
         plan.profilesOff.push_back(facts.asked.replacedProfile);
     }
 }
@@ -246,6 +242,11 @@ SetupPlan MakeSetupPlan(SetupFacts const& facts) {
     }
     PlanServices(facts, plan);
     return plan;
+}
+
+bool AsksAccessRules(PAMMeaning const& policy) {
+    return StackAsksAccessRules(PAMStackOf(policy, "auth")) &&
+           StackAsksAccessRules(PAMStackOf(policy, "account"));
 }
 
 std::string PolicyWith(std::vector<std::string> const& lines, std::string_view policy) {

@@ -2,9 +2,10 @@
 #ifndef TSLAUTHCTL_SETUPPLAN_H
 #define TSLAUTHCTL_SETUPPLAN_H
 
+#include <meaning/PAMMeaning.h>
+
 #include <map>
 #include <optional>
-#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -30,12 +31,6 @@ struct ProviderSetup {
 ///        `replaced-service`
 /// @throws base::KeyValueError
 ProviderSetup ReadProviderSetup(std::string_view text);
-
-/// Thrown where a host cannot be set up as it is.
-class SetupRefusal : public std::runtime_error {
-public:
-    using std::runtime_error::runtime_error;
-};
 
 /// What there is on the host.
 struct SetupFacts {
@@ -73,7 +68,8 @@ struct SetupPlan {
     /// A symbolic link that is made first, and where it leads; empty for none.
     std::string link;
     std::string linkTarget;
-    /// Profiles that pam-auth-update switches on and off; both are empty where all is as it should.
+    /// Profiles that pam-auth-update switches on and, where they are on, off; both are empty where all
+    /// is as it should.
     std::vector<std::string> profilesOn;
     std::vector<std::string> profilesOff;
     /// What is left to the administrator.
@@ -82,9 +78,12 @@ struct SetupPlan {
     bool Changes() const;
 };
 
-/// @throws SetupRefusal, with the reason
+/// @throws Failure (refused) where the active store would lose what it stands on
 /// @throws base::KeyValueError, authentication::ConfigurationError for a file that cannot be read
 SetupPlan MakeSetupPlan(SetupFacts const& facts);
+
+/// Whether the file of the access rules decides who logs in, by password and by key.
+bool AsksAccessRules(meaning::PAMMeaning const& policy);
 
 /// The default policy with a provider's lines in it.
 std::string PolicyWith(std::vector<std::string> const& lines, std::string_view policy);

@@ -6,7 +6,6 @@
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
-#include <tslauth/AuthenticationStore.h>
 #include <tslauth/Exceptions.h>
 
 #include <base/AsciiText.h>
@@ -24,14 +23,6 @@ std::vector<std::string> ChangedFiles(HostPlan const& plan) {
         }
     }
     return changed;
-}
-
-void MakeActive(std::string const& store) {
-    auto const instance = Stores().CreateInstance(store);
-    if (!instance.get()) {
-        throw Failure(ExitCode::usage, "Unknown store '" + store + "'");
-    }
-    instance->MakeActive();
 }
 
 } // namespace
@@ -82,7 +73,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         return ExitCode::loss;
     }
     try {
-        MakeActive(store);
+        plan.steps.Execute();
     } catch (std::exception const& e) {
         console.Error(Refused(e));
         auto const changed = ChangedFiles(plan);

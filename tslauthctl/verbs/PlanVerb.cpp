@@ -50,6 +50,9 @@ void DescribePlan(HostPlan const& plan, Console& console) {
 }
 
 ExitCode RunPlan(std::string const& store, Console& console) {
+    if (store.empty()) {
+        throw Failure(ExitCode::usage, "store is required (see tslauthctl plan --help)");
+    }
     RequireStore(store);
     auto const plan = MakeHostPlan(store);
     DescribePlan(plan, console);

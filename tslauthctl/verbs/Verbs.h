@@ -21,6 +21,27 @@ ExitCode RunStores(Console& console);
 ExitCode RunStatus(Console& console);
 ExitCode RunPlan(std::string const& store, Console& console);
 ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console);
+ExitCode RunPlanSetup(std::string const& provider, Console& console);
+ExitCode RunSetup(std::string const& provider, Console& console);
+ExitCode RunPlanUnsetup(Console& console);
+ExitCode RunUnsetup(Console& console);
+
+/// Who is permitted or denied to log in.
+struct AccessArguments {
+    bool denies = false;
+    std::vector<std::string> names;
+    /// Everybody of the domain.
+    bool all = false;
+    /// And of the domains that it trusts.
+    bool trusted = false;
+    /// Also names that nobody knows.
+    bool force = false;
+};
+
+ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& console);
+ExitCode RunAccess(AccessArguments const& arguments, Limit limit, Console& console);
+ExitCode RunListAccess(Console& console);
+
 ExitCode RunPrepare(bool write, bool acceptLoss, Console& console);
 
 /// In whose name a host is joined or parted.

@@ -44,8 +44,16 @@ TSLAUTH_EXPORT std::vector<std::string> EditedDatabases();
 
 /// How the two system files are edited.
 enum class EditForm {
-    /// Through the models: only what they know survives, in the form that they print.
-    Normalised
+    /// As the stores do it, through the models: only what they know survives, in the form that they
+    /// print.
+    Normalised,
+    /// Only the lines concerned change, and a file stays as it is where none is. Its links, owner,
+    /// access control list and extended attributes stay as well. A text that a model cannot read is
+    /// understood as the C library and libpam read it; where a model can read the outcome, it finds
+    /// what a store would have inserted, in the same places, and a store takes it out. `Withdrawing`
+    /// takes out every copy. A text in which the readers would not all find what is inserted is
+    /// refused with a `ConfigurationError`.
+    Lossless
 };
 
 /// One file that a plan writes, as it is and as it is going to be.
@@ -100,7 +108,9 @@ public:
                                       EditForm form = EditForm::Normalised);
 
     /// Records `store`, and then makes the store `previous` inactive.
-    static ActivationPlan Replacing(std::string const& previous, std::string const& store);
+    /// @param form of the files that the library's own stores edit; any other store is asked to do it
+    static ActivationPlan Replacing(std::string const& previous, std::string const& store,
+                                    EditForm form = EditForm::Normalised);
 
     ActivationPlan(ActivationPlan const& other);
     ActivationPlan& operator=(ActivationPlan const& other);

@@ -27,10 +27,11 @@ public:
     /// "None"
     std::string GetDisplayName() const override;
 
-    /// What `MakeActive` would do now, to be looked at before it is done.
+    /// What `MakeActive` would do now, to be looked at before it is done. With a form other than its
+    /// own, it is to be executed by the caller.
     /// @throws IOError, ConfigurationError, InvalidKeyException where `authentication.conf` cannot
     ///     be read
-    ActivationPlan GetActivationPlan() const;
+    ActivationPlan GetActivationPlan(EditForm form = EditForm::Normalised) const;
 
     /// Records "None" and withdraws the store that was recorded before. Where "None" is recorded
     /// already, nothing is written and no store is touched.
@@ -53,7 +54,7 @@ public:
     void MakeInactive() override;
 
 private:
-    ActivationPlan PlanFor(AuthenticationConfiguration const& record) const;
+    ActivationPlan PlanFor(AuthenticationConfiguration const& record, EditForm form) const;
 };
 
 } // namespace authentication

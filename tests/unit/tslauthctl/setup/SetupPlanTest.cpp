@@ -3,6 +3,7 @@
 
 #include "access/AccessRules.h"
 #include "setup/SetupPaths.h"
+#include "terminal/Console.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -153,7 +154,7 @@ TEST(SetupPlanTest, WhatTheActiveStoreNeedsIsNotReplaced) {
     for (auto const* const path : {Paths::PAMPolicy, Paths::ProviderConfiguration}) {
         auto facts = active;
         facts.texts[path] = "other = \"x\"\n";
-        EXPECT_THROW(MakeSetupPlan(facts), SetupRefusal) << path;
+        EXPECT_THROW(MakeSetupPlan(facts), Failure) << path;
         facts.texts[Paths::AuthenticationConfiguration] =
             "remote-authentication-store = \"None\"\n";
         EXPECT_NO_THROW(MakeSetupPlan(facts)) << path;
