@@ -71,7 +71,7 @@ TEST(AccessRulesTest, ADenialStandsFirstAndTakesThePermissionBack) {
 }
 
 TEST(AccessRulesTest, EditingTwiceIsEditingOnce) {
-    for (std::string const text :
+    for (std::string const& text :
          {std::string(), Last, "+:x:ALL\n" + Last, "+:CORP\\user1,x:ALL\n" + Last,
           std::string("-:(CORP\\domain users):ALL\n+:ALL:ALL\n")}) {
         for (auto const& subject : {User, Group, Everybody()}) {
