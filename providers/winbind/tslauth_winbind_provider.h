@@ -47,24 +47,34 @@ enum {
 
 enum { TSLAUTH_WINBIND_MAXIMUM_WAITING = 8 };
 
-/* What getDomainTrustState returns. Never fails: what could not be found out is a state as well. */
+/* What getDomainTrustState returns. It never fails: what could not be found out is a state as well.
+ *
+ *   number  in words        what was seen                             what to do
+ *   0       in order        the controller has accepted the host's    -
+ *                           secret, just now
+ *   1       refused         a controller answered, and refused the    part, and join again
+ *                           host: its account was deleted, disabled
+ *                           or given another secret
+ *   2       no controller   none answered within the bound; users     the network, DNS, the controllers
+ *                           that have logged in before may still be
+ *                           known
+ *   3       not running     winbindd does not run, so that no user    start it
+ *                           of the domain is known
+ *   4       not answering   winbindd runs, and does not answer        start it again
+ *   5       unknown         anything else                             the system log says what
+ *   6       clock           the clocks of the host and of the         set them
+ *                           controller are too far apart
+ *   7       not joined      the host is joined to no domain; the      join
+ *                           library gives the same number
+ */
 enum {
-    /* The controller has accepted the host's secret, just now. */
     TSLAUTH_WINBIND_TRUST_HEALTHY = 0,
-    /* A controller answered, and refused the host: its account was deleted, disabled or given
-     * another secret. Part, and join again. */
     TSLAUTH_WINBIND_TRUST_SECRET_REFUSED = 1,
-    /* No controller answered within the bound. Users that have logged in before may still be known. */
     TSLAUTH_WINBIND_TRUST_NO_CONTROLLER = 2,
-    /* winbindd does not run, so that no user of the domain is known. */
     TSLAUTH_WINBIND_TRUST_NOT_RUNNING = 3,
-    /* winbindd runs and does not answer. */
     TSLAUTH_WINBIND_TRUST_NOT_ANSWERING = 4,
-    /* Anything else; the system log says what. */
     TSLAUTH_WINBIND_TRUST_UNKNOWN = 5,
-    /* The clocks of the host and of the controller are too far apart. */
     TSLAUTH_WINBIND_TRUST_CLOCK = 6,
-    /* The host is joined to no domain. The library gives the same number. */
     TSLAUTH_WINBIND_TRUST_NOT_JOINED = 7
 };
 
