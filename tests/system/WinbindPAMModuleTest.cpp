@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The PAM module of the provider `winbind` as libpam loads it, beside a module that plays Samba's and
-// with a program that plays the one that asks the domain. What it does in a domain is shown by
+// The PAM module of the provider `winbind` as libpam loads it, beside a module that plays Samba's
+// and with a program that plays the one that asks the domain. What it does in a domain is shown by
 // tests/lab.
 #include "Node.h"
 #include "TemporaryFolder.h"

@@ -3,8 +3,8 @@
 
 #include <chrono>
 
-/// How long a log-in waits for the domain's word on a user. With a controller that answers it takes a
-/// fifth of a second.
+/// How long a log-in waits for the domain's word on a user. With a controller that answers it takes
+/// a fifth of a second.
 namespace tessel::winbind::AccountBounds {
 
 /// For winbindd and the controller.

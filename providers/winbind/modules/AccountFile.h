@@ -4,8 +4,8 @@
 
 /*
  * The names and numbers in the text of passwd(5) or group(5), of which both have the name in the
- * first field and the number in the third. The C library reads such a file likewise: blanks before a
- * line and lines that begin with "#" do not count.
+ * first field and the number in the third. The C library reads such a file likewise: blanks before
+ * a line and lines that begin with "#" do not count.
  */
 
 #include <stdbool.h>

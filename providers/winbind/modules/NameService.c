@@ -1,12 +1,13 @@
 /* SPDX-License-Identifier: Apache-2.0 */
 /*
  * The name service `tslauth_winbind`, which is the first of its database: users and groups of the
- * domain, from winbindd, and never one whose name or number the host's own files hold. Asked for one
- * of those it says NOTFOUND at once, without winbindd; an answer of winbindd that holds one is none.
+ * domain, from winbindd, and never one whose name or number the host's own files hold. Asked for
+ * one of those it says NOTFOUND at once, without winbindd; an answer of winbindd that holds one is
+ * none.
  *
  * libwbclient is loaded with the first question about somebody else: most processes ask none, and
- * each of them would pay for it. Nothing is kept from one question to the next, so that any thread may
- * ask, also in a child of a process with threads.
+ * each of them would pay for it. Nothing is kept from one question to the next, so that any thread
+ * may ask, also in a child of a process with threads.
  *
  * There are no functions that list all users or groups: winbindd lists none, as it is set up here.
  */

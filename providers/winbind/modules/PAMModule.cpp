@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The PAM module of the provider. A user of the host's own files is none of its business: for him
-/// every entry answers PAM_IGNORE at once, as if it did not stand there. Everybody else is Samba's
-/// module's, which is loaded from the same folder, but for the entry with the parameter `check_only`:
-/// that one, in `account`, asks whether the domain lets the user log in.
+// The PAM module of the provider. A user of the host's own files is none of its business: for him
+// every entry answers PAM_IGNORE at once, as if it did not stand there. Everybody else is Samba's
+// module's, which is loaded from the same folder, but for the entry with the parameter
+// `check_only`: that one, in `account`, asks whether the domain lets the user log in.
 #include "Failure.h"
 #include "Paths.h"
 #include "host/ChildProcess.h"
@@ -60,8 +60,8 @@ std::string UserOf(pam_handle_t* handle) {
     return isSet ? static_cast<char const*>(user) : std::string();
 }
 
-/// Beside this file, wherever that is. Never unloaded: what it has left with libpam it has to clean up
-/// itself, when this module may be gone already.
+/// Beside this file, wherever that is. Never unloaded: what it has left with libpam it has to clean
+/// up itself, when this module may be gone already.
 void* SambaModule(pam_handle_t* handle) {
     Dl_info self = {};
     if (::dladdr(&authenticated, &self) == 0) {
@@ -90,8 +90,8 @@ int Forward(char const* function, Call& call) {
     return result;
 }
 
-/// Samba's module puts the name that winbindd knows a user by in place of the one that was typed. That
-/// may be a local user's, who would be logged in then.
+/// Samba's module puts the name that winbindd knows a user by in place of the one that was typed.
+/// That may be a local user's, who would be logged in then.
 bool HasBecomeLocal(pam_handle_t* handle, std::string const& user) {
     std::string const name = UserOf(handle);
     if (name == user || WhoseName(name.c_str()) == Whose::Directory) {

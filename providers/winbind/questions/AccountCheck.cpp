@@ -7,11 +7,15 @@
 #include "host/SystemLog.h"
 #include "samba/WinbindClient.h"
 
+#include <base/AsciiText.h>
 #include <cstdint>
 #include <cstdlib>
 #include <exception>
+#include <optional>
 #include <ratio>
 #include <vector>
+
+using tessel::base::AsciiText::EqualsIgnoringCase;
 
 namespace tessel::winbind {
 
@@ -48,20 +52,41 @@ bool NamesADomain(std::string const& user) {
     return user.find_first_of("\\@") != std::string::npos;
 }
 
-AccountAnswer AskDirectory(Host const& host, WinbindClient const& client, SambaDomain const& own,
-                           WinbindClient::Account const& account, Clock::time_point deadline) {
-    // winbindd prints the domain's name in capitals, whatever the join was told.
-    std::string const controller = account.domain == own.workgroup
-                                       ? std::string()
-                                       : client.FindDomainController(account.domain, "");
-    std::vector<DirectoryEntry> const entries =
-        SearchDirectory(host, controller, "(objectSid=" + account.identifier + ")",
-                        {control, computed, expiry}, deadline);
-    if (entries.size() != 1) {
-        throw Failure(TSLAUTH_PROVIDER_NO_SUCH_USER,
-                      "the directory has no account " + account.identifier);
+/// Who knows the accounts of `domain`, a NetBIOS name; empty for the host's own domain.
+std::string ControllerOf(std::string const& domain, SambaDomain const& own,
+                         WinbindClient const& client) {
+    if (EqualsIgnoringCase(domain, own.workgroup)) {
+        return {};
     }
-    return StateOfAccount(entries.front(), std::chrono::system_clock::now());
+    for (WinbindClient::Domain const& known : client.ListDomains()) {
+        if (EqualsIgnoringCase(domain, known.names.NetBIOSName())) {
+            return client.FindDomainController(known.names.DNSName(), "");
+        }
+    }
+    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "winbindd does not list '" + domain + "'");
+}
+
+/// An account that winbindd remembers may be gone meanwhile, or not have come to that controller
+/// yet.
+AccountAnswer AskDirectory(Host const& host, std::string const& controller,
+                           std::string const& identifier, Clock::time_point deadline) {
+    std::vector<DirectoryEntry> const entries = SearchDirectory(
+        host, controller, "(objectSid=" + identifier + ")", {control, computed, expiry}, deadline);
+    return entries.size() == 1 ? StateOfAccount(entries.front(), std::chrono::system_clock::now())
+                               : AccountAnswer::NoAnswer;
+}
+
+/// Nothing where winbindd knows no such user.
+std::optional<WinbindClient::Account> FindAccount(WinbindClient const& client,
+                                                  std::string const& user) {
+    try {
+        return client.GetAccount(user);
+    } catch (Failure const& failure) {
+        if (failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_USER) {
+            return std::nullopt;
+        }
+        throw;
+    }
 }
 
 AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point deadline) {
@@ -70,14 +95,12 @@ AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point d
         return AccountAnswer::NotOfTheDomain;
     }
     WinbindClient const client(deadline);
-    try {
-        return AskDirectory(host, client, membership->domain, client.GetAccount(user), deadline);
-    } catch (Failure const& failure) {
-        if (failure.Code() == TSLAUTH_PROVIDER_NO_SUCH_USER && !NamesADomain(user)) {
-            return AccountAnswer::NotOfTheDomain;
-        }
-        throw;
+    auto const account = FindAccount(client, user);
+    if (!account) {
+        return NamesADomain(user) ? AccountAnswer::NoAnswer : AccountAnswer::NotOfTheDomain;
     }
+    return AskDirectory(host, ControllerOf(account->domain, membership->domain, client),
+                        account->identifier, deadline);
 }
 
 } // namespace
