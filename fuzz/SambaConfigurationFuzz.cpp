@@ -140,13 +140,13 @@ extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size
     }
 
     SambaDomain domain{"CORP.EXAMPLE", "CORP", "HOST1", {}};
-    auto const file = SambaDomainText(domain, settings);
+    auto const file = SambaDomainText(domain, settings, {});
     auto const read = ReadSambaDomain(file);
     Expect("the own file is read back", read ? read->realm + read->workgroup : "nothing",
            "CORP.EXAMPLECORP");
     auto const changed = WithPreferredControllers(file, {"dc1"});
     domain.preferredControllers = {"dc1"};
-    Expect("other controllers change nothing else", changed, SambaDomainText(domain, settings));
+    Expect("other controllers change nothing else", changed, SambaDomainText(domain, settings, {}));
     Expect("no controllers is as before", WithPreferredControllers(changed, {}), file);
     return 0;
 }

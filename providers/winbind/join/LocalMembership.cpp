@@ -254,7 +254,7 @@ void WriteConfiguration(Host const& host, Domain const& domain, std::set<Made> c
     std::string const text = ReadHostFile(samba).value_or("");
     changes.Replace(host.At(Paths::OwnSamba),
                     Membership::Record(made) +
-                        SambaDomainText(domain.samba, AdministratorSettings(text)),
+                        SambaDomainText(domain.samba, AdministratorSettings(text), {}),
                     0644);
     changes.Replace(samba, WithSambaInclude(text, Paths::OwnSamba), 0644);
 }

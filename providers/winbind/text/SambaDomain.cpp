@@ -56,14 +56,13 @@ std::string PasswordServers(std::vector<std::string> const& controllers) {
 }
 
 /// What holds for a joined host and for one that is being joined.
-void AddMembership(GlobalSection& section, SambaDomain const& domain) {
+void AddMembership(GlobalSection& section, SambaDomain const& domain, bool keytab) {
     section.Add("workgroup", domain.workgroup);
     section.Add("realm", domain.realm);
     section.Add("netbios name", domain.netbiosName);
     section.Add("security", "ads");
     section.Add("server role", "member server");
-    // The keytab would be the host's, and Samba's tools may crash on the way to it.
-    section.Add("kerberos method", "secrets only");
+    section.Add("kerberos method", keytab ? "secrets and keytab" : "secrets only");
     if (!domain.preferredControllers.empty()) {
         section.Add("password server", PasswordServers(domain.preferredControllers));
     }
@@ -128,14 +127,15 @@ std::vector<std::string> ReadControllers(std::string_view servers) {
 
 } // namespace
 
-std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& administrator) {
+std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& administrator,
+                            ProviderOptions const& options) {
     GlobalSection section(
         "# Written by tslauth when the host joined its domain, and again at every change of it.\n"
         "# Settings of your own belong into smb.conf: those of the first block are overruled "
         "here,\n"
         "# one of the second block is left to smb.conf, from the next join on, once it is set "
         "there.\n");
-    AddMembership(section, domain);
+    AddMembership(section, domain, options.keytab);
     // A controller that does not answer must not hold up questions for winbindd's whole minute.
     section.Add("winbind request timeout", "5");
     // One that is back must not go unnoticed for half a minute.
@@ -144,11 +144,11 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
     // it, all of winbindd waits while it looks for the controllers of those domains, which may be
     // silent, and everybody's log-in waits with it, root's too.
     section.Add("winbind scan trusted domains", "no");
-    // Names are DOMAIN\name everywhere, so that no user of the domain is taken for a local one.
-    section.Add("winbind use default domain", "no");
+    section.Add("winbind use default domain", options.shortNames ? "yes" : "no");
+    section.Add("winbind offline logon", options.offlineLogIn ? "yes" : "no");
     section.Text() += '\n';
 
-    auto const unlessSet = [&](char const* name, char const* value) {
+    auto const unlessSet = [&](char const* name, std::string const& value) {
         if (!administrator.Sets(name)) {
             section.Add(name, value);
         }
@@ -156,8 +156,8 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
     // Nobody answers broadcasts for a domain of this kind; waiting for them would only take time.
     unlessSet("disable netbios", "yes");
     unlessSet("name resolve order", "host");
-    unlessSet("template shell", "/bin/sh");
-    unlessSet("template homedir", "/home/%D/%U");
+    unlessSet("template shell", options.loginShell);
+    unlessSet("template homedir", options.homeFolder);
     AddIdmaps(section, domain.workgroup, administrator);
 
     if (administrator.Sets("winbind separator")) {
@@ -170,7 +170,8 @@ std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& admi
 
 std::string StagedSambaDomainText(SambaDomain const& domain, std::string const& directory) {
     GlobalSection section("");
-    AddMembership(section, domain);
+    // An offline join crashes where it is to write a keytab.
+    AddMembership(section, domain, false);
     section.Add("disable netbios", "yes"); // broadcasts would only take time
     section.Add("name resolve order", "host");
     section.Add("private dir", directory + "/private");

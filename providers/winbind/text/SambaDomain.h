@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "text/ProviderOptions.h"
 #include "text/SambaSettings.h"
 
 #include <optional>
@@ -23,10 +24,11 @@ struct SambaDomain {
 
 /// The provider's own file, for a host whose administrator sets `administrator`. What the provider
 /// depends on always stands in it; what is a matter of taste only where the administrator leaves it
-/// open. The numbers of users and groups come from ranges that overlap with none of his. Comments may
+/// open; of the options those are so that are. The numbers of users and groups come from ranges that overlap with none of his. Comments may
 /// be put in front of the text and nothing behind it: its last line may have to be without a line end.
 /// @throws Failure TSLAUTH_PROVIDER_INVALID_PARAMETER for a value with a control character
-std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& administrator);
+std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& administrator,
+                            ProviderOptions const& options);
 
 /// A whole smb.conf for a tool that must not touch the host: every directory that Samba keeps
 /// anything in is below `directory`. It includes nothing.

@@ -23,8 +23,9 @@ using Texts = std::vector<std::string>;
 
 SambaDomain const Corp{"CORP.EXAMPLE", "CORP", "HOST1", {}};
 
-std::string TextFor(std::string_view administrator, SambaDomain const& domain = Corp) {
-    return SambaDomainText(domain, SambaSettings(administrator));
+std::string TextFor(std::string_view administrator, SambaDomain const& domain = Corp,
+                    ProviderOptions const& options = {}) {
+    return SambaDomainText(domain, SambaSettings(administrator), options);
 }
 
 TEST(SambaDomainTest, TheFileOfTheProviderHoldsAllSettings) {
@@ -38,7 +39,7 @@ TEST(SambaDomainTest, RequiredSettingsStandWhateverTheAdministratorSets) {
     for (char const* const line :
          {"\tworkgroup = CORP\n", "\trealm = CORP.EXAMPLE\n", "\tnetbios name = HOST1\n",
           "\tsecurity = ads\n", "\tserver role = member server\n",
-          "\twinbind use default domain = no\n", "\tkerberos method = secrets only\n"}) {
+          "\twinbind use default domain = no\n", "\tkerberos method = secrets and keytab\n"}) {
         EXPECT_THAT(text, HasSubstr(line));
     }
 }
@@ -49,6 +50,22 @@ TEST(SambaDomainTest, MattersOfTasteAreLeftToTheAdministrator) {
     EXPECT_THAT(text, Not(HasSubstr("template shell")));
     EXPECT_THAT(text, HasSubstr("\ttemplate homedir = /home/%D/%U\n"));
     EXPECT_THAT(text, Not(HasSubstr("idmap")));
+}
+
+TEST(SambaDomainTest, OptionsAreSettings) {
+    ProviderOptions options;
+    options.shortNames = true;
+    options.offlineLogIn = true;
+    options.keytab = false;
+    options.loginShell = "/bin/zsh";
+    options.homeFolder = "/srv/%U";
+    std::string const text = TextFor("", Corp, options);
+    for (char const* const line :
+         {"\twinbind use default domain = yes\n", "\twinbind offline logon = yes\n",
+          "\tkerberos method = secrets only\n", "\ttemplate shell = /bin/zsh\n",
+          "\ttemplate homedir = /srv/%U\n"}) {
+        EXPECT_THAT(text, HasSubstr(line));
+    }
 }
 
 TEST(SambaDomainTest, NumbersComeFromRangesThatTheAdministratorDoesNotUse) {
