@@ -25,6 +25,10 @@ inline constexpr char PreferredControllersKey[] = "preferred-domain-controllers"
 inline constexpr char Secrets[] = "secrets.tdb";
 inline constexpr char SecretsBeforeJoin[] = "tslauth-before-join.tdb";
 
+/// The host's keytab, and the same file as it was before the join, likewise.
+inline constexpr char Keytab[] = "/etc/krb5.keytab";
+inline constexpr char KeytabBeforeJoin[] = "/etc/krb5.keytab.tslauth-before-join";
+
 /// Where Samba logs, unless its configuration says otherwise.
 inline constexpr char SambaLogs[] = "/var/log/samba";
 

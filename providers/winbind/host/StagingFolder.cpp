@@ -100,6 +100,14 @@ void StagingFolder::SetSecrets(std::string_view database) {
     Write(SecretsPath(), database);
 }
 
+void StagingFolder::SetKeytab(std::string_view keytab) {
+    Write(KeytabPath(), keytab);
+}
+
+std::string StagingFolder::Keytab() const {
+    return ReadHostFile(KeytabPath()).value_or("");
+}
+
 std::string StagingFolder::Memory() const {
     return _path + "/lock";
 }

@@ -33,6 +33,14 @@ public:
     /// The secrets as the tools left them; empty where they made none.
     std::string Secrets() const;
 
+    /// The same for a keytab.
+    void SetKeytab(std::string_view keytab);
+    std::string Keytab() const;
+
+    std::string KeytabPath() const {
+        return _path + "/krb5.keytab";
+    }
+
     /// Where tools that work with the host's own configuration can keep what they remember.
     std::string Memory() const;
 

@@ -8,6 +8,7 @@
 #include "host/Membership.h"
 #include "host/OperationLock.h"
 #include "host/PreferredControllers.h"
+#include "host/ProviderFile.h"
 #include "host/StagingFolder.h"
 #include "host/SystemLog.h"
 #include "join/AccountUndo.h"
@@ -33,6 +34,7 @@ namespace {
 /// of which may have to wait, and the account is deleted.
 constexpr auto undoTime = std::chrono::seconds(55);
 constexpr auto toolLimit = std::chrono::seconds(45);
+constexpr auto dnsLimit = std::chrono::seconds(10);
 constexpr auto lookLimit = std::chrono::seconds(10);
 constexpr std::size_t longestBlob = std::size_t(1024) * 1024;
 constexpr std::size_t longestNetBIOSName = 15;
@@ -41,7 +43,14 @@ constexpr std::size_t longestNetBIOSName = 15;
 struct Order {
     std::string domain;
     std::string computer;
+    ProviderOptions options;
     Clock::time_point deadline;
+
+    /// The host's full name in the domain.
+    std::string DNSHostName(Host const& host) const {
+        std::string const name = host.Name();
+        return base::AsciiText::Lower(name.substr(0, name.find('.'))) + '.' + domain;
+    }
 };
 
 /// A host that can be joined.
@@ -61,7 +70,7 @@ struct Partner {
 
 /// What the controller's half of a join has made.
 struct Secrets {
-    std::string database;
+    LocalMembership::Secrets files;
     /// Who can delete the account; null: it was not made by this join.
     Account const* account;
 };
@@ -142,13 +151,23 @@ Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
     if (!secrets.empty()) {
         staging.SetSecrets(secrets);
     }
+    std::string const keytab = LocalMembership::KeytabBeforeJoin(host);
+    if (order.options.keytab && !keytab.empty()) {
+        staging.SetKeytab(keytab);
+    }
     return {answer, AccountUndo::Begin(ahead), preferred};
 }
 
-std::string SecretsIn(StagingFolder const& staging) {
-    std::string secrets = staging.Secrets();
-    if (secrets.empty()) {
+LocalMembership::Secrets SecretsIn(StagingFolder const& staging, SambaTools const& tools,
+                                   Order const& order, Partner const& partner) {
+    LocalMembership::Secrets secrets;
+    secrets.database = staging.Secrets();
+    if (secrets.database.empty()) {
         throw Failure(TSLAUTH_WINBIND_SEE_SYSTEM_LOG, "the join has made no secrets");
+    }
+    if (order.options.keytab) {
+        tools.WriteKeytab(partner.answer.controller, staging.KeytabPath(), ToolDeadline(order));
+        secrets.keytab = staging.Keytab();
     }
     return secrets;
 }
@@ -169,9 +188,11 @@ Secrets MakeSecrets(Host const& host, Order const& order, Partner const& partner
     SambaTools const tools(host, staging);
     bool isMade = false;
     try {
-        tools.Join(partner.answer.controller, account, unit, ToolDeadline(order));
+        tools.Join(partner.answer.controller, account, unit,
+                   order.options.computerName.empty() ? "" : order.DNSHostName(host),
+                   ToolDeadline(order));
         isMade = true;
-        return {SecretsIn(staging), &account};
+        return {SecretsIn(staging, tools, order, partner), &account};
     } catch (Failure const& e) {
         if (!isMade && !MayComeFromTheMiddle(e.Code())) {
             throw;
@@ -191,10 +212,11 @@ Secrets MakeSecrets(Host const& host, Order const& order, Partner const& partner
     }
 }
 
-Secrets MakeSecrets(Host const& host, Order const& order, SecretFile const& blob,
-                    StagingFolder const& staging) {
-    SambaTools(host, staging).JoinOffline(blob, ToolDeadline(order));
-    return {SecretsIn(staging), nullptr};
+Secrets MakeSecrets(Host const& host, Order const& order, Partner const& partner,
+                    SecretFile const& blob, StagingFolder const& staging) {
+    SambaTools const tools(host, staging);
+    tools.JoinOffline(blob, ToolDeadline(order));
+    return {SecretsIn(staging, tools, order, partner), nullptr};
 }
 
 /// What has become of the half of a membership that was in the way.
@@ -240,8 +262,9 @@ void TakeOver(Host const& host, Order const& order, FreeHost const& free, Partne
         LocalMembership::Establish(host, free.folders,
                                    {{partner.answer.Realm(), partner.answer.netBIOSDomain,
                                      order.computer, partner.preferred},
-                                    order.domain},
-                                   secrets.database, changes, order.deadline);
+                                    order.domain,
+                                    order.options},
+                                   secrets.files, changes, order.deadline);
     } catch (Failure const& e) {
         ThrowUndone(order, partner, secrets, tools, changes,
                     isDissolved || e.Code() == TSLAUTH_WINBIND_HOST_CHANGED, e.Code(), e.what());
@@ -268,6 +291,20 @@ void TellOfUnit(Order const& order, Partner const& partner, std::string const& u
     }
 }
 
+/// A matter of convenience: the host is joined, whatever DNS says.
+void RegisterInDNS(Host const& host, Order const& order, Partner const& partner,
+                   SambaTools const& tools) {
+    if (!order.options.registerInDNS) {
+        return;
+    }
+    try {
+        tools.RegisterInDNS(partner.answer.controller, order.DNSHostName(host),
+                            std::min(order.deadline, Clock::now() + dnsLimit));
+    } catch (Failure const& e) {
+        LogWarning(std::string("the host's name is not registered in DNS: ") + e.what());
+    }
+}
+
 void CheckBlob(std::string_view blob) {
     static constexpr std::string_view allowed = "ABCDEFGHIJKLMNOPQRSTUVWXYZ"
                                                 "abcdefghijklmnopqrstuvwxyz"
@@ -279,8 +316,14 @@ void CheckBlob(std::string_view blob) {
     }
 }
 
+/// A host whose own name does not serve has another one in the options.
+std::string ComputerNameOf(Host const& host, ProviderOptions const& options) {
+    return ComputerName(options.computerName.empty() ? host.Name() : options.computerName);
+}
+
 Order OrderOf(Host const& host, std::string const& domain) {
-    return {DomainName(domain), ComputerName(host.Name()),
+    ProviderOptions const options = ReadProviderOptions(host.At(Paths::State));
+    return {DomainName(domain), ComputerNameOf(host, options), options,
             Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_JOIN_SECONDS) - undoTime};
 }
 
@@ -300,6 +343,7 @@ void WithCredentials(Host const& host, std::string const& domain, std::string co
     Secrets const secrets = MakeSecrets(host, order, partner, account, place, staging);
     SambaTools const tools(host, staging);
     TakeOver(host, order, free, partner, secrets, tools);
+    RegisterInDNS(host, order, partner, tools);
     if (!place.empty()) {
         TellOfUnit(order, partner, place, account, tools);
     }
@@ -329,13 +373,15 @@ void WithMachineAccount(Host const& host, ActiveDirectoryClientDomainInformation
         // The others may not have heard of the account yet.
         partner.preferred.push_back(controller);
     }
-    Secrets const secrets = MakeSecrets(host, order, blob, staging);
-    TakeOver(host, order, free, partner, secrets, SambaTools(host, staging));
+    Secrets const secrets = MakeSecrets(host, order, partner, blob, staging);
+    SambaTools const tools(host, staging);
+    TakeOver(host, order, free, partner, secrets, tools);
+    RegisterInDNS(host, order, partner, tools);
 }
 
 void RequireJoinable(Host const& host) {
     auto const deadline = Clock::now() + lookLimit;
-    (void)ComputerName(host.Name());
+    (void)ComputerNameOf(host, ReadProviderOptions(host.At(Paths::State)));
     RequirePrograms(host);
     SambaFolders const folders = ReadSambaFolders(host, deadline);
     RequireNotJoined(host, folders, deadline);

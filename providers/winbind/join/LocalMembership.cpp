@@ -47,8 +47,8 @@ std::string BeforeJoinOf(SambaFolders const& folders) {
 }
 
 std::vector<std::string> ChangedFiles(Host const& host, SambaFolders const& folders) {
-    return {host.At(Paths::Samba), host.At(Paths::OwnSamba), host.At(Paths::Kerberos),
-            host.At(Paths::OwnKerberos), SecretsOf(folders)};
+    return {host.At(Paths::Samba),       host.At(Paths::OwnSamba), host.At(Paths::Kerberos),
+            host.At(Paths::OwnKerberos), SecretsOf(folders),       host.At(Paths::Keytab)};
 }
 
 void ReplaceAndKeep(std::string const& path, std::string const& text) {
@@ -73,12 +73,10 @@ SambaSettings AdministratorSettings(std::string const& text) {
     return settings;
 }
 
-/// Keeps the secrets of before for a part, and puts the new ones in their place.
-void ReplaceSecrets(SambaFolders const& folders, std::string const& secrets, HostChanges& changes) {
-    std::string const path = SecretsOf(folders);
-    std::string const before = BeforeJoinOf(folders);
-    (void)changes.MakeFolder(folders.state, 0755); // Samba's packages come with them
-    (void)changes.MakeFolder(folders.secrets, 0700);
+/// Keeps the file of before for a part, and puts one with the secrets of a join in its place.
+/// @param before where it is kept, in a file system of both
+void ReplaceSecrets(std::string const& path, std::string const& before, std::string const& secrets,
+                    HostChanges& changes) {
     RemoveHostFile(before);
     changes.OnUndo([before] { RemoveHostFile(before); });
     if (!FileExists(path)) {
@@ -90,9 +88,10 @@ void ReplaceSecrets(SambaFolders const& folders, std::string const& secrets, Hos
 }
 
 /// The reverse, for a part: of the secret of the host's account, nothing stays.
-void RestoreSecrets(SambaFolders const& folders) {
-    std::string const path = SecretsOf(folders);
-    std::string const before = BeforeJoinOf(folders);
+void RestoreSecrets(std::string const& path, std::string const& before) {
+    if (!FileExists(before)) {
+        return;
+    }
     if (ReadHostFile(before).value_or("").empty()) {
         RemoveHostFile(path);
         RemoveHostFile(before);
@@ -167,11 +166,8 @@ bool RemoveRest(Host const& host, SambaFolders const& folders, Membership const&
     bool const runs = daemon->Runs();
     bool const isWhole = RunAll({
         [&] { daemon->Stop(Clock::now() + stopLimit); },
-        [&] {
-            if (FileExists(BeforeJoinOf(folders))) {
-                RestoreSecrets(folders);
-            }
-        },
+        [&] { RestoreSecrets(SecretsOf(folders), BeforeJoinOf(folders)); },
+        [&] { RestoreSecrets(host.At(Paths::Keytab), host.At(Paths::KeytabBeforeJoin)); },
         [&] { RemoveKerberos(host, made); },
         [&] { RemoveCaches(folders, membership.domain.workgroup); },
     });
@@ -254,7 +250,7 @@ void WriteConfiguration(Host const& host, Domain const& domain, std::set<Made> c
     std::string const text = ReadHostFile(samba).value_or("");
     changes.Replace(host.At(Paths::OwnSamba),
                     Membership::Record(made) +
-                        SambaDomainText(domain.samba, AdministratorSettings(text), {}),
+                        SambaDomainText(domain.samba, AdministratorSettings(text), domain.options),
                     0644);
     changes.Replace(samba, WithSambaInclude(text, Paths::OwnSamba), 0644);
 }
@@ -293,7 +289,7 @@ void RequireRoom(Host const& host, SambaFolders const& folders) {
 }
 
 void Establish(Host const& host, SambaFolders const& folders, Domain const& domain,
-               std::string const& secrets, HostChanges& changes, Clock::time_point deadline) {
+               Secrets const& secrets, HostChanges& changes, Clock::time_point deadline) {
     auto const daemon = host.Winbindd(folders);
     std::set<Made> const made = MissingOf(host, *daemon);
     if (made.count(Made::Daemon) == 0) {
@@ -302,7 +298,13 @@ void Establish(Host const& host, SambaFolders const& folders, Domain const& doma
     }
     (void)changes.MakeFolder(FolderOf(host.At(Paths::Samba)), 0755);
     changes.Mark(host.At(Paths::OpenChange), Membership::Record(made));
-    ReplaceSecrets(folders, secrets, changes);
+    (void)changes.MakeFolder(folders.state, 0755); // Samba's packages come with them
+    (void)changes.MakeFolder(folders.secrets, 0700);
+    ReplaceSecrets(SecretsOf(folders), BeforeJoinOf(folders), secrets.database, changes);
+    if (!secrets.keytab.empty()) {
+        ReplaceSecrets(host.At(Paths::Keytab), host.At(Paths::KeytabBeforeJoin), secrets.keytab,
+                       changes);
+    }
     WriteConfiguration(host, domain, made, changes);
     StartDaemon(daemon, folders, host.At(Paths::SambaLogs), changes, deadline);
 }
@@ -350,6 +352,12 @@ std::string SecretsOfMember(SambaFolders const& folders) {
 
 std::string SecretsBeforeJoin(Host const& host, SambaFolders const& folders) {
     return ReadHostFile(IsHalf(host) ? BeforeJoinOf(folders) : SecretsOf(folders)).value_or("");
+}
+
+std::string KeytabBeforeJoin(Host const& host) {
+    std::string const before = host.At(Paths::KeytabBeforeJoin);
+    return ReadHostFile(IsHalf(host) && FileExists(before) ? before : host.At(Paths::Keytab))
+        .value_or("");
 }
 
 } // namespace tessel::winbind::LocalMembership

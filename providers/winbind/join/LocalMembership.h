@@ -18,6 +18,13 @@ namespace LocalMembership {
 struct Domain {
     SambaDomain samba;
     std::string dnsName;
+    ProviderOptions options = {};
+};
+
+/// What the controller's half of a join has made.
+struct Secrets {
+    std::string database;
+    std::string keytab; ///< empty: the host's stays as it is
 };
 
 /// Whether there is room for what winbindd writes when it starts.
@@ -29,7 +36,7 @@ void RequireRoom(Host const& host, SambaFolders const& folders);
 /// @param changes takes everything back, winbindd included, where the caller does not keep it
 /// @throws Failure, with `changes` holding what has been done so far
 void Establish(Host const& host, SambaFolders const& folders, Domain const& domain,
-               std::string const& secrets, HostChanges& changes, Clock::time_point deadline);
+               Secrets const& secrets, HostChanges& changes, Clock::time_point deadline);
 
 /// Makes the host local again: smb.conf first, with which it is parted, then the rest.
 /// @throws Failure before smb.conf is changed, and the host is as it was; 0xFFFF0002 later, where
@@ -48,6 +55,9 @@ bool IsHalf(Host const& host);
 /// The secrets that a join starts from, so that what others keep there comes along: those of before
 /// a membership that was left in half.
 std::string SecretsBeforeJoin(Host const& host, SambaFolders const& folders);
+
+/// The same for the host's keytab.
+std::string KeytabBeforeJoin(Host const& host);
 
 /// The secrets of a host that is joined.
 std::string SecretsOfMember(SambaFolders const& folders);

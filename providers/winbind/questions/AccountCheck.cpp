@@ -5,6 +5,7 @@
 #include "host/Host.h"
 #include "host/Membership.h"
 #include "host/SystemLog.h"
+#include "questions/Questions.h"
 #include "samba/WinbindClient.h"
 
 #include <base/AsciiText.h>
@@ -52,20 +53,6 @@ bool NamesADomain(std::string const& user) {
     return user.find_first_of("\\@") != std::string::npos;
 }
 
-/// Who knows the accounts of `domain`, a NetBIOS name; empty for the host's own domain.
-std::string ControllerOf(std::string const& domain, SambaDomain const& own,
-                         WinbindClient const& client) {
-    if (EqualsIgnoringCase(domain, own.workgroup)) {
-        return {};
-    }
-    for (WinbindClient::Domain const& known : client.ListDomains()) {
-        if (EqualsIgnoringCase(domain, known.names.NetBIOSName())) {
-            return client.FindDomainController(known.names.DNSName(), "");
-        }
-    }
-    throw Failure(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, "winbindd does not list '" + domain + "'");
-}
-
 /// An account that winbindd remembers may be gone meanwhile, or not have come to that controller
 /// yet.
 AccountAnswer AskDirectory(Host const& host, std::string const& controller,
@@ -99,7 +86,8 @@ AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point d
     if (!account) {
         return NamesADomain(user) ? AccountAnswer::NoAnswer : AccountAnswer::NotOfTheDomain;
     }
-    return AskDirectory(host, ControllerOf(account->domain, membership->domain, client),
+    bool const isOwn = EqualsIgnoringCase(account->domain, membership->domain.workgroup);
+    return AskDirectory(host, isOwn ? "" : GetAnyDomainController(host, "", account->domain),
                         account->identifier, deadline);
 }
 

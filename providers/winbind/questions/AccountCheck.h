@@ -21,8 +21,10 @@ AccountAnswer StateOfAccount(DirectoryEntry const& entry,
                              std::chrono::system_clock::time_point now);
 
 /// Asks winbindd who `user` is, a name in any form that the name service takes, and a controller of
-/// his domain for his account. Needs root. Blocks until `deadline` at the latest; every failure is
-/// `NoAnswer`, with its cause in the system log.
+/// his domain for his account. Needs root. Every failure is `NoAnswer`, with its cause in the
+/// system log.
+/// @param deadline for each of them; a controller of another domain may have to be found before, in
+///     the time of a question
 AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
                               Clock::time_point deadline);
 

@@ -137,10 +137,14 @@ std::optional<std::chrono::seconds> SambaTools::ClockOffset(std::string const& c
 }
 
 void SambaTools::Join(std::string const& controller, Account const& account,
-                      std::string const& unit, Clock::time_point deadline) const {
+                      std::string const& unit, std::string const& dnsHostName,
+                      Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     Append(task, {"ads", "join", "--no-dns-updates", "-S", controller.c_str()});
     account.AddTo(task);
+    if (!dnsHostName.empty()) {
+        task.arguments.push_back("dnshostname=" + dnsHostName);
+    }
     if (!unit.empty()) {
         task.arguments.push_back("createcomputer=" + unit);
     }
@@ -151,6 +155,23 @@ void SambaTools::JoinOffline(SecretFile const& blob, Clock::time_point deadline)
     ChildProcess::Task task = Task();
     Append(task, {"offlinejoin", "requestodj", "loadfile=/proc/self/fd/3"});
     task.secrets = {&blob};
+    (void)RunToSuccess(*_host, task, deadline);
+}
+
+void SambaTools::WriteKeytab(std::string const& controller, std::string const& path,
+                             Clock::time_point deadline) const {
+    ChildProcess::Task task = Task();
+    // Only here: an offline join crashes where it is to write a keytab.
+    Append(task, {"ads", "keytab", "create", "-P", "-S", controller.c_str(),
+                  "--option=kerberos method=secrets and keytab"});
+    task.environment.push_back("KRB5_KTNAME=FILE:" + path);
+    (void)RunToSuccess(*_host, task, deadline);
+}
+
+void SambaTools::RegisterInDNS(std::string const& controller, std::string const& name,
+                               Clock::time_point deadline) const {
+    ChildProcess::Task task = Task();
+    Append(task, {"ads", "dns", "register", "-P", "-S", controller.c_str(), name.c_str()});
     (void)RunToSuccess(*_host, task, deadline);
 }
 

@@ -40,11 +40,21 @@ public:
                                                     Clock::time_point deadline) const;
 
     /// @param unit a distinguished name, or empty: where the domain puts new computers
+    /// @param dnsHostName the host's full name; empty: the computer's name in the domain
     void Join(std::string const& controller, Account const& account, std::string const& unit,
-              Clock::time_point deadline) const;
+              std::string const& dnsHostName, Clock::time_point deadline) const;
 
     /// Takes the membership from the text of an offline join. Asks nobody.
     void JoinOffline(SecretFile const& blob, Clock::time_point deadline) const;
+
+    /// Adds the keys of the host's account to a keytab, which may not be there yet. They are those of
+    /// the secrets, which the account must have been made with.
+    void WriteKeytab(std::string const& controller, std::string const& path,
+                     Clock::time_point deadline) const;
+
+    /// Tells the domain's DNS the host's addresses, as the host's account.
+    void RegisterInDNS(std::string const& controller, std::string const& name,
+                       Clock::time_point deadline) const;
 
     /// Deletes the host's account and its secrets.
     /// @param account null: the host's own

@@ -20,7 +20,7 @@ struct ProviderOptions {
     /// `offline-log-in`
     bool offlineLogIn = false;
     /// `keytab`
-    bool keytab = true;
+    bool keytab = false;
     /// `register-in-dns`
     bool registerInDNS = false;
 };

@@ -59,6 +59,8 @@ protected:
         _host = std::make_unique<PlayedHost>();
         _host->Write(Paths::Samba, administrators);
         _host->Write(secretsPath, othersSecrets);
+        _host->Write(Paths::State, "keytab = \"yes\"\n");
+        _host->Write(Paths::Keytab, "others' keys, ");
         _before = _host->Tree();
     }
 

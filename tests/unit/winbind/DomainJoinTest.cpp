@@ -63,8 +63,11 @@ Code Part(PlayedHost const& host) {
     return CodeOf([&] { PartFromDomain(host, &credentials); });
 }
 
-/// As an administrator has it, with the secrets of others.
+/// As an administrator has it, with the secrets and keys of others.
 void Furnish(PlayedHost const& host) {
+    host.Write(Paths::State, "keytab = \"yes\"\n");
+    host.Write(Paths::Keytab, "others' keys, ");
+    ASSERT_EQ(0, ::chmod(host.At(Paths::Keytab).c_str(), 0600));
     host.Write(Paths::Samba, administrators);
     host.Write(Paths::Kerberos, "[libdefaults]\n");
     host.Write("/var/lib/samba/private/secrets.tdb", "others' secrets");
@@ -131,6 +134,92 @@ TEST(DomainJoinTest, TheUnitIsHandedOn) {
     ASSERT_EQ(0U, Join(host, "secret", "Servers/Linux"));
     EXPECT_THAT(host.State().log,
                 HasSubstr("createcomputer=OU=Linux,OU=Servers,DC=corp,DC=example\n"));
+}
+
+TEST(DomainJoinTest, TheOptionsOfTheProvidersFileCount) {
+    PlayedHost host;
+    host.Write(Paths::State, "short-names = \"yes\"\nhome-folder = \"/srv/%U\"\n");
+    ASSERT_EQ(0U, Join(host));
+    EXPECT_THAT(host.Read(Paths::OwnSamba), HasSubstr("winbind use default domain = yes\n"));
+    EXPECT_THAT(host.Read(Paths::OwnSamba), HasSubstr("template homedir = /srv/%U\n"));
+}
+
+TEST(DomainJoinTest, AnOptionThatIsNoneIsFoundBeforeAnythingIsAsked) {
+    PlayedHost host;
+    host.Write(Paths::State, "short-names = \"maybe\"\n");
+    std::string text;
+    EXPECT_EQ(TSLAUTH_PROVIDER_INVALID_PARAMETER, Join(host, "secret", "", &text));
+    EXPECT_THAT(text, HasSubstr("the option 'short-names' is 'maybe' and must be 'yes' or 'no'"));
+    EXPECT_EQ(0U, host.State().calls);
+}
+
+TEST(DomainJoinTest, AHostJoinsUnderTheNameOfTheOption) {
+    PlayedHost host;
+    host.Write(Paths::State, "computer-name = \"rack17\"\n");
+    ASSERT_EQ(0U, Join(host));
+    EXPECT_EQ("RACK17", Membership::Read(host)->domain.netbiosName);
+    EXPECT_THAT(host.State().log, HasSubstr(" dnshostname=node.corp.example\n"));
+}
+
+TEST(DomainJoinTest, AComputerNameThatIsTooLongIsRefused) {
+    PlayedHost host;
+    host.Write(Paths::State, "computer-name = \"hypervisor-rack17\"\n");
+    EXPECT_EQ(TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME, Join(host));
+    EXPECT_EQ(0U, host.State().calls);
+}
+
+TEST(DomainJoinTest, TheKeytabIsWrittenWhereItIsAskedForAndPutBackByAPart) {
+    for (bool const wasThere : {false, true}) {
+        PlayedHost host;
+        host.Write(Paths::State, "keytab = \"yes\"\n");
+        if (wasThere) {
+            host.Write(Paths::Keytab, "others' keys, ");
+            ASSERT_EQ(0, ::chmod(host.At(Paths::Keytab).c_str(), 0600));
+        }
+        auto const before = host.Tree();
+        ASSERT_EQ(0U, Join(host));
+        EXPECT_EQ(wasThere ? "others' keys, keys of node" : "keys of node",
+                  host.Read(Paths::Keytab));
+        struct stat status = {};
+        ASSERT_EQ(0, ::stat(host.At(Paths::Keytab).c_str(), &status));
+        EXPECT_EQ(0600U, status.st_mode & 0777U);
+        EXPECT_THAT(host.Read(Paths::OwnSamba),
+                    HasSubstr("kerberos method = secrets and keytab\n"));
+        ASSERT_EQ(0U, Part(host));
+        auto after = host.Tree();
+        for (char const* const path :
+             {"/etc/krb5.keytab", "/etc/krb5.keytab.tslauth-before-join"}) {
+            EXPECT_EQ(before.count(path), after.count(path)) << path;
+        }
+        if (wasThere) {
+            EXPECT_EQ(before.at(Paths::Keytab), after.at(Paths::Keytab));
+        }
+    }
+}
+
+TEST(DomainJoinTest, WithoutTheOptionTheKeytabIsLeftAlone) {
+    PlayedHost host;
+    host.Write(Paths::Keytab, "others' keys");
+    ASSERT_EQ(0U, Join(host));
+    EXPECT_EQ("others' keys", host.Read(Paths::Keytab));
+    EXPECT_THAT(host.State().log, Not(HasSubstr("keytab")));
+    EXPECT_THAT(host.State().log, Not(HasSubstr("dns register")));
+    ASSERT_EQ(0U, Part(host));
+    EXPECT_EQ("others' keys", host.Read(Paths::Keytab));
+}
+
+TEST(DomainJoinTest, DNSIsToldWhereItIsAskedForAndItsNoIsNoneForTheJoin) {
+    PlayedHost host;
+    host.Write(Paths::State, "register-in-dns = \"yes\"\n");
+    ASSERT_EQ(0U, Join(host));
+    EXPECT_THAT(host.State().log, HasSubstr(" ads dns register -P -S dc1.corp.example "
+                                            "node.corp.example\n"));
+    std::size_t const last = host.State().calls;
+    PlayedHost other;
+    other.Write(Paths::State, "register-in-dns = \"yes\"\n");
+    other.FailAt(last, Fault::Refused);
+    EXPECT_EQ(0U, Join(other));
+    EXPECT_TRUE(Membership::Read(other));
 }
 
 TEST(DomainJoinTest, NoSecretIsInAnArgument) {

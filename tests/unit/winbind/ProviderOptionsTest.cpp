@@ -28,7 +28,7 @@ TEST(ProviderOptionsTest, WithoutAFileEverythingIsAsPeersHaveIt) {
     EXPECT_EQ("/bin/bash", options.loginShell);
     EXPECT_EQ("/home/%D/%U", options.homeFolder);
     EXPECT_FALSE(options.offlineLogIn);
-    EXPECT_TRUE(options.keytab);
+    EXPECT_FALSE(options.keytab);
     EXPECT_FALSE(options.registerInDNS);
 }
 
@@ -38,7 +38,7 @@ TEST(ProviderOptionsTest, EveryOptionIsTaken) {
                                                {"login-shell", "/bin/sh"},
                                                {"home-folder", "/srv/%U"},
                                                {"offline-log-in", "yes"},
-                                               {"keytab", "no"},
+                                               {"keytab", "yes"},
                                                {"register-in-dns", "yes"},
                                                {"preferred-domain-controllers", "dc1"}});
     EXPECT_EQ("node17", options.computerName);
@@ -46,7 +46,7 @@ TEST(ProviderOptionsTest, EveryOptionIsTaken) {
     EXPECT_EQ("/bin/sh", options.loginShell);
     EXPECT_EQ("/srv/%U", options.homeFolder);
     EXPECT_TRUE(options.offlineLogIn);
-    EXPECT_FALSE(options.keytab);
+    EXPECT_TRUE(options.keytab);
     EXPECT_TRUE(options.registerInDNS);
 }
 

@@ -39,7 +39,7 @@ TEST(SambaDomainTest, RequiredSettingsStandWhateverTheAdministratorSets) {
     for (char const* const line :
          {"\tworkgroup = CORP\n", "\trealm = CORP.EXAMPLE\n", "\tnetbios name = HOST1\n",
           "\tsecurity = ads\n", "\tserver role = member server\n",
-          "\twinbind use default domain = no\n", "\tkerberos method = secrets and keytab\n"}) {
+          "\twinbind use default domain = no\n", "\tkerberos method = secrets only\n"}) {
         EXPECT_THAT(text, HasSubstr(line));
     }
 }
@@ -56,13 +56,13 @@ TEST(SambaDomainTest, OptionsAreSettings) {
     ProviderOptions options;
     options.shortNames = true;
     options.offlineLogIn = true;
-    options.keytab = false;
+    options.keytab = true;
     options.loginShell = "/bin/zsh";
     options.homeFolder = "/srv/%U";
     std::string const text = TextFor("", Corp, options);
     for (char const* const line :
          {"\twinbind use default domain = yes\n", "\twinbind offline logon = yes\n",
-          "\tkerberos method = secrets only\n", "\ttemplate shell = /bin/zsh\n",
+          "\tkerberos method = secrets and keytab\n", "\ttemplate shell = /bin/zsh\n",
           "\ttemplate homedir = /srv/%U\n"}) {
         EXPECT_THAT(text, HasSubstr(line));
     }
