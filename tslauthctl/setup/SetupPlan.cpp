@@ -48,9 +48,9 @@ std::string WithValue(std::string_view key, std::string_view value, std::string_
     return given ? out : out + line;
 }
 
-std::optional<std::string> const& TextOf(std::string const& path, SetupFacts const& facts) {
+std::optional<std::string> const& TextOf(std::string_view path, SetupFacts const& facts) {
     static std::optional<std::string> const none;
-    auto const found = facts.texts.find(path);
+    auto const found = facts.texts.find(std::string(path));
     return found == facts.texts.end() ? none : found->second;
 }
 
