@@ -62,6 +62,21 @@ std::string ReadDefaultPolicy() {
     return std::move(*text);
 }
 
+/// Whether libpam finds the access module by the name that the policy gives it. Debian's, which has
+/// its modules in a folder of the architecture, looks in one place alone.
+/// @throws Failure where there is no such module
+bool FindsModules(std::string const& folder) {
+    auto const inFolder = folder + "/" + Paths::PAMAccessModule;
+    if (Exists(inFolder)) {
+        return Exists(std::string(Paths::ModuleLink) + "/" + Paths::PAMAccessModule);
+    }
+    if (IsMissingPAMModule(std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule)) {
+        throw Failure(ExitCode::refused,
+                      "There is no '" + inFolder + "', which decides who may log in");
+    }
+    return true;
+}
+
 /// Owns a process that was started.
 class Child {
 public:
@@ -173,15 +188,8 @@ SetupFacts ReadSetupFacts(std::string const& provider) {
     for (auto const& path : SetupPaths()) {
         facts.texts[path] = TextOnHost(path);
     }
-    facts.findsModules =
-        !IsMissingPAMModule(std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule);
     facts.moduleFolder = "/lib/" TSLAUTH_LIBRARY_ARCHITECTURE "/security";
-    if (!facts.findsModules && !Exists(facts.moduleFolder + "/" + Paths::PAMAccessModule)) {
-        throw Failure(ExitCode::refused, "There is no '" + facts.moduleFolder + "/" +
-                                             Paths::PAMAccessModule +
-                                             "', which decides who may "
-                                             "log in");
-    }
+    facts.findsModules = FindsModules(facts.moduleFolder);
     for (auto const* const profile : Paths::Profiles) {
         if (Exists(Paths::ProfileProgram) && Exists(std::string(Paths::ProfileFolder) + profile)) {
             facts.profiles.emplace_back(profile);

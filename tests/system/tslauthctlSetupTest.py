@@ -1,0 +1,335 @@
+#!/usr/bin/python3 -B
+# SPDX-License-Identifier: Apache-2.0
+"""A Debian host is set up for the provider `winbind` and becomes what it was again: with the real
+libpam, pam-auth-update and modules, but for Samba's module and the program that asks the domain,
+which are played. The users of the domain come from a file."""
+
+import filecmp
+import os
+import pathlib
+import shutil
+import subprocess
+import unittest
+
+from tslauthctl import *
+
+TREE = pathlib.Path(__file__).parents[2]
+BUILD = pathlib.Path(os.environ["TSLAUTH_BUILD"])
+ACCESS = pathlib.Path("/etc/tessel/tslauth/access.conf")
+STATE = pathlib.Path("/var/lib/tslauth/setup")
+LINK = pathlib.Path("/lib/security/lib/security")
+PROFILES = pathlib.Path("/usr/share/pam-configs")
+SERVICE = "setup-test"
+USER = "CORP\\Ann Lee"
+GROUP = "CORP\\domain users"
+
+STOCK_NSS = """# /etc/nsswitch.conf
+
+passwd:         files extrausers winbind
+group:          files extrausers winbind
+shadow:         files
+gshadow:        files
+
+hosts:          files mdns4_minimal [NOTFOUND=return] dns
+"""
+
+SAMBA_PROFILE = """Name: Samba's, played
+Default: yes
+Priority: 192
+Auth-Type: Primary
+Auth:
+\t[success=end default=ignore]\tpam_winbind.so try_first_pass
+Account-Type: Primary
+Account:
+\t[success=end new_authtok_reqd=done default=ignore]\tpam_winbind.so
+"""
+
+
+def play_domain(answer):
+    program = pathlib.Path("/usr/libexec/tslauth/winbind-account")
+    program.write_text(f"#!/bin/sh\necho \"$*\" >>/run/asked\necho {answer}\n")
+    program.chmod(0o755)
+
+
+def log_in(user, *operations, password="", service=SERVICE):
+    """What pamtester says, and whether everything was let through."""
+    process = subprocess.run(["pamtester", service, user, *operations], timeout=60, text=True,
+                             input=password + "\n", stdout=subprocess.PIPE,
+                             stderr=subprocess.STDOUT)
+    return process.returncode == 0
+
+
+def install():
+    """What the packages would bring."""
+    modules = pathlib.Path(subprocess.run(
+        ["find", "/usr/lib", "-path", "*/security/pam_permit.so", "-print", "-quit"], text=True,
+        check=True, stdout=subprocess.PIPE).stdout.strip()).parent
+    shutil.rmtree(modules / "lib")
+    for name in ("pam_tslauth_winbind.so", "pam_winbind.so"):
+        shutil.copy(BUILD / "providers/modules" / name, modules)
+    pathlib.Path("/usr/share/tslauth/setup").mkdir(parents=True)
+    shutil.copy(TREE / "etc/system-auth-generic", "/usr/share/tslauth")
+    shutil.copy(TREE / "providers/winbind/setup.conf", "/usr/share/tslauth/setup/winbind.conf")
+    for profile in (TREE / "etc/pam-configs").iterdir():
+        shutil.copy(profile, PROFILES)
+    (PROFILES / "winbind").write_text(SAMBA_PROFILE)
+    subprocess.run(["pam-auth-update", "--enable", "winbind"], check=True,
+                   env={**os.environ, "DEBIAN_FRONTEND": "noninteractive"})
+
+
+def populate():
+    pathlib.Path("/etc/pam.d", SERVICE).write_text(
+        "@include common-auth\n@include common-account\n@include common-password\n"
+        "session required pam_permit.so\n@include common-session\n")
+    pathlib.Path("/etc/pam.d/setup-test-direct").write_text(
+        "auth include system-auth-generic\naccount include system-auth-generic\n")
+    subprocess.run(["useradd", "--create-home", "lena"], check=True)
+    subprocess.run(["chpasswd"], input="lena:local secret\n", text=True, check=True)
+    extra = pathlib.Path("/var/lib/extrausers")
+    extra.mkdir(exist_ok=True)
+    (extra / "passwd").write_text(
+        f"{USER}:*:7001:7001::/home/CORP/ann:/bin/bash\nCORP\\other:*:7002:7001::/home/other:/bin/sh\n")
+    (extra / "group").write_text(f"{GROUP}:x:7001:\n")
+
+
+def leave_stock_host():
+    """A host where nobody has set up anything."""
+    shutil.rmtree("/etc/tessel", ignore_errors=True)
+    shutil.rmtree(STATE, ignore_errors=True)
+    PAM.unlink(missing_ok=True)
+    NSS.write_text(STOCK_NSS)
+    pathlib.Path("/run/asked").unlink(missing_ok=True)
+    play_domain("in-order")
+
+
+def etc():
+    """Every file of /etc: its bytes, or where it leads."""
+    found = {}
+    for folder, folders, names in os.walk("/etc"):
+        for name in names + folders:
+            path = pathlib.Path(folder, name)
+            if path.is_symlink():
+                found[path] = os.readlink(path)
+            elif path.is_file():
+                found[path] = (path.read_bytes(), path.stat().st_mode, path.stat().st_uid)
+            else:
+                found[path] = "folder"
+    return found
+
+
+class SetupTest(unittest.TestCase):
+    def setUp(self):
+        leave_stock_host()
+        self.before = etc()
+
+    def tearDown(self):
+        self.assertIn(run("unsetup").returncode, (DONE, LOSS))
+        shutil.rmtree(STATE, ignore_errors=True)
+        subprocess.run(["pam-auth-update", "--force", "--disable", "tslauth", "tslauth-password",
+                        "--enable", "winbind"], check=True, stdout=subprocess.DEVNULL,
+                       env={**os.environ, "DEBIAN_FRONTEND": "noninteractive"})
+
+    def set_up(self):
+        document = ask("setup", "--provider", "winbind")
+        self.assertEqual(document["exit"], DONE, document)
+        return document
+
+    def set_up_and_activate(self):
+        self.set_up()
+        self.assertEqual(ask("activate", AD)["exit"], DONE)
+
+    def test_the_plan_shows_what_setup_does_and_changes_nothing(self):
+        plan = ask("plan", "setup", "--provider", "winbind")
+        self.assertEqual(plan["exit"], CHANGES)
+        self.assertEqual(etc(), self.before)
+        self.assertEqual(plan["link"]["path"], str(LINK))
+        done = self.set_up()
+        for field in ("files", "link", "profiles_on", "profiles_off"):
+            self.assertEqual(done[field], plan[field])
+        self.assertEqual(done["profiles_on"], ["tslauth", "tslauth-password"])
+        self.assertEqual(done["profiles_off"], ["winbind"])
+        self.assertTrue((LINK / "pam_access.so").exists())
+
+    def test_a_second_setup_changes_nothing(self):
+        self.set_up()
+        first = etc()
+        self.assertEqual(ask("plan", "setup", "--provider", "winbind")["exit"], DONE)
+        document = self.set_up()
+        self.assertFalse(any(file["changed"] for file in document["files"]))
+        self.assertEqual(etc(), first)
+        self.assertEqual(ask("activate", AD)["exit"], DONE)
+        self.assertEqual(ask("plan", "setup", "--provider", "winbind")["exit"], DONE)
+
+    def test_unsetup_restores_every_byte_of_etc(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        document = ask("unsetup")
+        self.assertEqual(document["exit"], DONE, document)
+        self.assertEqual(etc(), self.before)
+        self.assertFalse(LINK.exists())
+        self.assertFalse(STATE.exists())
+        self.assertIn("pam_winbind.so", pathlib.Path("/etc/pam.d/common-auth").read_text())
+        self.assertEqual(ask("unsetup")["exit"], DONE)
+        self.assertEqual(etc(), self.before)
+
+    def test_what_was_changed_since_stays_and_is_told(self):
+        self.set_up()
+        NSS.write_text(NSS.read_text().replace("gshadow:        files\n", "").replace(
+            "hosts:          files", "hosts:          files myhostname"))
+        changed = NSS.read_bytes()
+        self.assertEqual(ask("plan", "unsetup")["exit"], CHANGES)
+        document = ask("unsetup")
+        self.assertEqual(document["exit"], LOSS)
+        outcomes = {file["path"]: file for file in document["files"]}
+        self.assertEqual(outcomes[str(NSS)]["outcome"], "changed-since")
+        self.assertEqual(outcomes[str(NSS)]["lines_added"], 1)
+        self.assertEqual(outcomes[str(NSS)]["lines_removed"], 2)
+        self.assertEqual(outcomes[str(PAM)]["outcome"], "removed")
+        self.assertEqual(NSS.read_bytes(), changed)
+        self.assertEqual((STATE / "before/etc/nsswitch.conf").read_text(), STOCK_NSS)
+        after = etc()
+        del after[NSS], self.before[NSS]
+        self.assertEqual(after, self.before)
+
+    def test_local_users_log_in_as_before_and_are_never_asked_about(self):
+        for prepare in (self.set_up, lambda: ask("activate", AD)):
+            prepare()
+            self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", "open_session",
+                                   password="local secret"))
+            self.assertFalse(log_in("lena", "authenticate", password="wrong"))
+            self.assertTrue(log_in("root", "acct_mgmt"))
+        for service in (SERVICE, "setup-test-direct"):
+            self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", password="local secret",
+                                   service=service))
+            self.assertFalse(log_in("lena", "authenticate", password="wrong", service=service))
+        self.assertFalse(pathlib.Path("/run/asked").exists())
+
+    def test_nobody_of_the_domain_logs_in_until_permitted(self):
+        self.set_up_and_activate()
+        self.assertFalse(log_in(USER, "authenticate"))
+        self.assertFalse(log_in(USER, "acct_mgmt"), "a key asks nothing else")
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        self.assertTrue(log_in(USER, "authenticate", "acct_mgmt"))
+        self.assertTrue(log_in(USER, "acct_mgmt"))
+        self.assertFalse(log_in("CORP\\other", "acct_mgmt"))
+        self.assertEqual(ask("permit", GROUP)["exit"], DONE)
+        self.assertTrue(log_in("CORP\\other", "acct_mgmt"))
+        self.assertEqual(ask("deny", USER)["exit"], DONE)
+        self.assertFalse(log_in(USER, "authenticate", "acct_mgmt"))
+        self.assertTrue(log_in("CORP\\other", "acct_mgmt"))
+        self.assertEqual(ask("deny", "--all")["exit"], DONE)
+        self.assertFalse(log_in("CORP\\other", "acct_mgmt"))
+
+    def test_whom_the_domain_has_disabled_is_refused_with_a_key_as_well(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        for answer in ("disabled", "locked-out", "expired", "gibberish"):
+            play_domain(answer)
+            self.assertFalse(log_in(USER, "acct_mgmt"), answer)
+        play_domain("in-order")
+        self.assertTrue(log_in(USER, "acct_mgmt"))
+
+    def test_nobody_of_the_domain_logs_in_while_none_is_active(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        self.assertEqual(ask("activate", "None")["exit"], DONE)
+        self.assertFalse(log_in(USER, "authenticate", password="any"))
+        self.assertFalse(log_in(USER, "acct_mgmt"))
+
+    def test_the_home_directory_is_made_at_the_first_log_in(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        home = pathlib.Path("/home/CORP/ann")
+        self.assertFalse(home.exists())
+        self.assertTrue(log_in(USER, "open_session"))
+        self.assertEqual(home.stat().st_mode & 0o7777, 0o700)
+        self.assertEqual(home.stat().st_uid, 7001)
+
+    def test_activate_and_back_loses_nothing(self):
+        self.set_up()
+        before = texts()
+        self.assertEqual(ask("activate", AD)["exit"], DONE)
+        self.assertIn(b"passwd:         tslauth_winbind files extrausers\n", NSS.read_bytes())
+        self.assertEqual(ask("activate", "None")["exit"], DONE)
+        self.assertEqual(texts(), before)
+
+    def test_sambas_profile_that_comes_back_is_switched_off_again(self):
+        self.set_up()
+        (PROFILES / "winbind").write_text(SAMBA_PROFILE)
+        auth = pathlib.Path("/etc/pam.d/common-auth")
+        subprocess.run(["pam-auth-update", "--disable", "tslauth", "tslauth-password", "--enable",
+                        "winbind"], check=True,
+                       env={**os.environ, "DEBIAN_FRONTEND": "noninteractive"})
+        self.assertIn("pam_winbind.so", auth.read_text())
+        self.set_up()
+        self.assertNotIn("pam_winbind.so", auth.read_text())
+        self.assertIn("system-auth-generic", auth.read_text())
+
+    def test_service_policies_that_were_edited_by_hand_are_named(self):
+        auth = pathlib.Path("/etc/pam.d/common-auth")
+        text = auth.read_text()
+        auth.write_text(text.replace("# here are the per-package modules", "# here were"))
+        document = ask("setup", "--provider", "winbind")
+        self.assertEqual(document["exit"], REFUSED)
+        self.assertIn(str(auth), document["error"]["message"])
+        self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", password="local secret"))
+        auth.write_text(text)
+
+    def test_a_host_whose_store_is_active_keeps_what_it_stands_on(self):
+        self.set_up_and_activate()
+        PAM.write_text(PLAIN_PAM)
+        document = ask("setup", "--provider", "winbind")
+        self.assertEqual(document["exit"], REFUSED)
+        self.assertEqual(PAM.read_text(), PLAIN_PAM)
+
+    def test_a_provider_that_is_not_installed_is_refused(self):
+        for name, code in (("absent", REFUSED), ("../winbind", USAGE)):
+            self.assertEqual(ask("setup", "--provider", name)["exit"], code)
+        self.assertEqual(etc(), self.before)
+
+    def test_names_that_nobody_knows_are_refused_unless_forced(self):
+        self.set_up_and_activate()
+        before = ACCESS.read_bytes()
+        for name in ("nobody-knows-it", "lena", "root"):
+            self.assertEqual(ask("permit", name)["exit"], REFUSED, name)
+        self.assertEqual(ask("permit", "--force", "a,b")["exit"], REFUSED)
+        for arguments in (("permit",), ("permit", "--all", USER), ("permit", "--trusted", USER)):
+            self.assertEqual(ask(*arguments)["exit"], USAGE)
+        self.assertEqual(ACCESS.read_bytes(), before)
+        self.assertEqual(ask("permit", "--force", "nobody-knows-it")["exit"], DONE)
+        self.assertIn(b"+:nobody-knows-it:ALL\n", ACCESS.read_bytes())
+
+    def test_permissions_are_previewed_listed_and_given_once(self):
+        self.set_up_and_activate()
+        before = ACCESS.read_bytes()
+        plan = ask("plan", "permit", USER, f"({GROUP})")
+        self.assertEqual(plan["exit"], CHANGES)
+        self.assertEqual(ACCESS.read_bytes(), before)
+        done = ask("permit", USER, f"({GROUP})")
+        self.assertEqual(done["diff"], plan["diff"])
+        self.assertFalse(ask("permit", USER, f"({GROUP})")["changed"])
+        listed = ask("permit", "--list")
+        self.assertEqual(
+            [(rule["permits"], rule["names"]) for rule in listed["rules"]],
+            [(True, [{"name": USER, "group": False}]), (True, [{"name": GROUP, "group": True}]),
+             (False, [{"name": "ALL", "group": False}])])
+        self.assertFalse(listed["by_default"])
+        self.assertEqual(ask("permit", "--all", "--trusted")["exit"], DONE)
+        self.assertTrue(ask("permit", "--list")["by_default"])
+
+    def test_without_setup_nobody_is_permitted(self):
+        self.assertEqual(ask("permit", "--force", USER)["exit"], REFUSED)
+        self.assertEqual(ask("permit", "--list")["exit"], REFUSED)
+
+    def test_only_root_changes_the_host(self):
+        for arguments in (("setup", "--provider", "winbind"), ("unsetup",), ("permit", USER)):
+            process = subprocess.run(["setpriv", "--reuid", "65534", TOOL, *arguments],
+                                     stderr=subprocess.PIPE, timeout=60)
+            self.assertEqual(process.returncode, NOT_ROOT)
+
+
+if __name__ == "__main__":
+    if os.environ.get("TSLAUTH_NODE") == "1":
+        install()
+        populate()
+    main()
