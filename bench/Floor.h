@@ -74,8 +74,8 @@ inline File Read(char const* path) {
 }
 
 /// Replaces a file through a temporary one: `write(descriptor)` fills it.
-/// openat (mkstemp), close, openat, ..., stat, fchmod, fsync, close, stat, rename, chmod, and for the
-/// folder openat, fsync, close
+/// openat (mkstemp), close, openat, ..., stat, fchmod, fsync, close, stat, rename, chmod, and for
+/// the folder openat, fsync, close
 template <typename Write> void Replace(std::string const& path, Write write) {
     char name[4096];
     char const* const target = path.c_str();

@@ -9,9 +9,9 @@
 /// The form of files of `key = "value"` lines: text in, pieces of it out.
 ///
 /// A line is split at its first "=". Blanks (space and tab) around a key or a value and one pair of
-/// equal quotes around it, of either kind, are not part of it; what holds nothing but blanks is left
-/// as it is. There are no comments and no escapes. A carriage return is no blank: a file with CRLF
-/// line ends keeps it in its values.
+/// equal quotes around it, of either kind, are not part of it; what holds nothing but blanks is
+/// left as it is. There are no comments and no escapes. A carriage return is no blank: a file with
+/// CRLF line ends keeps it in its values.
 namespace tessel::base {
 
 /// One assignment of a file, as pieces of its text.
@@ -33,9 +33,9 @@ private:
 
 /// @param line one that is not blank, without its line feed
 /// @param lineNumber for the message
-/// @throws KeyValueError "Error parsing configuration on line " + number + ": no delimiter found", or
-///     "Error parsing configuration at line " + number + ": invalid quoting" for a key or value that
-///     is one lone quote
+/// @throws KeyValueError "Error parsing configuration on line " + number + ": no delimiter found",
+///     or "Error parsing configuration at line " + number + ": invalid quoting" for a key or value
+///     that is one lone quote
 Assignment SplitAssignment(std::string_view line, int lineNumber);
 
 constexpr bool IsBlank(char character) {

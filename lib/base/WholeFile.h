@@ -77,15 +77,15 @@ struct Replacing {
 /// access control list, the label and all other extended attributes of the target. It takes the
 /// target's place in `Commit`, and is gone without it.
 ///
-/// Its name begins with `TemporaryPrefix`. It never is somebody else's file, whatever stands in that
-/// folder, since the system makes it anew under a name that nothing had.
+/// Its name begins with `TemporaryPrefix`. It never is somebody else's file, whatever stands in
+/// that folder, since the system makes it anew under a name that nothing had.
 ///
 /// Not promised: a target that is mounted on its own (a bind mount) cannot be replaced, and a
 /// process that is not root leaves the owner to the system.
 class FileReplacement {
 public:
-    /// @throws FileError "Cannot replace '" + path + "': " + the reason, or as `Destination`; nothing
-    ///     is left then
+    /// @throws FileError "Cannot replace '" + path + "': " + the reason, or as `Destination`;
+    ///     nothing is left then
     FileReplacement(std::string const& path, std::string_view text, Replacing how = {});
     FileReplacement(FileReplacement const&) = delete;
     FileReplacement& operator=(FileReplacement const&) = delete;

@@ -7,9 +7,9 @@
 #include <string_view>
 
 /// The one place where the library reads and replaces files, and where what goes wrong with the
-/// system becomes its own exception. Nothing here holds state, so that everything may be called from
-/// any thread; it blocks as long as the file system does. What is done to a file, <base/WholeFile.h>
-/// says.
+/// system becomes its own exception. Nothing here holds state, so that everything may be called
+/// from any thread; it blocks as long as the file system does. What is done to a file,
+/// <base/WholeFile.h> says.
 namespace StrandCtl {
 
 /// Throws `HostCtlException` with `what` + ": " + the system's text for an error number.

@@ -271,7 +271,8 @@ private:
     SystemConfiguration::NSSService _service;
 };
 
-/// Records the name of the active store. The key must be there; it is looked up when its turn comes.
+/// Records the name of the active store. The key must be there; it is looked up when its turn
+/// comes.
 class RecordStep : public ActivationStep {
 public:
     explicit RecordStep(std::string store) : _store(std::move(store)) {}

@@ -22,8 +22,8 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-/// Lets one worker at a time ask a question. It holds the process's number while one does: the child
-/// of a fork has no workers, and finds that of its parent.
+/// Lets one worker at a time ask a question. It holds the process's number while one does: the
+/// child of a fork has no workers, and finds that of its parent.
 using Turn = std::atomic<pid_t>;
 
 /// @return false where it is not the caller's turn by `deadline`

@@ -38,8 +38,8 @@ bool VerifiesCertificates() {
     return value != 0;
 }
 
-/// What `use(store)` returns, where `store` is the thumbprint store as it is now. A store that cannot
-/// be opened or replaced is what has to be repaired.
+/// What `use(store)` returns, where `store` is the thumbprint store as it is now. A store that
+/// cannot be opened or replaced is what has to be repaired.
 template <typename Use> auto WithThumbprintStore(Use use) {
     try {
         CAMThumbprintStore store(Paths::CAMThumbprintStore);

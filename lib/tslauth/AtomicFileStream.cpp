@@ -136,7 +136,8 @@ void AtomicFileStream::Commit() {
         (void)::chmod(_tempName.c_str(), 0600);
         ThrowIOError("Unable to rename '" + _tempName + "' to '" + _targetName + "'", error);
     }
-    // Once more: the target's mode may be a later one than `Sync` saw, which need not have been called.
+    // Once more: the target's mode may be a later one than `Sync` saw, which need not have been
+    // called.
     if (known && ::chmod(_targetName.c_str(), old.st_mode & 07777) != 0) {
         permissionError = SystemText(errno);
     }

@@ -23,8 +23,8 @@ using base::SystemText;
 /// @param openFailure how the message for a file that cannot be opened begins:
 ///        openFailure + " '" + path + "': " + the system's text
 /// @throws IOError if the file cannot be opened, is none ("Cannot read '" + path + "': it is not a
-///         regular file") or, as `onReadError` says, cannot be read ("Cannot read '" + path + "': " +
-///         the system's text)
+///         regular file") or, as `onReadError` says, cannot be read ("Cannot read '" + path + "': "
+///         + the system's text)
 std::string ReadFile(std::string const& path, char const* openFailure = "Cannot open",
                      OnReadError onReadError = OnReadError::Throw);
 

@@ -16,8 +16,8 @@ using namespace tessel::authentication;
 
 namespace {
 
-/// The exit status of a child that does `work`, or minus the signal that ended it. A child that hangs
-/// is ended after some seconds.
+/// The exit status of a child that does `work`, or minus the signal that ended it. A child that
+/// hangs is ended after some seconds.
 template <typename Work> int InChild(Work work) {
     pid_t const child = fork();
     if (child == 0) {

@@ -22,8 +22,8 @@ bool Succeeds(std::string const& command) {
     return std::system((command + " >/dev/null 2>&1").c_str()) == 0;
 }
 
-/// A disk of our own, with a file system that has no journal to put things right again. What a cut of
-/// the power leaves is what the kernel has handed to the disk so far.
+/// A disk of our own, with a file system that has no journal to put things right again. What a cut
+/// of the power leaves is what the kernel has handed to the disk so far.
 class PowerLossTest : public testing::Test {
 protected:
     static constexpr char Old[] = "key = \"old\"\n";

@@ -21,8 +21,8 @@ using namespace tessel::authentication;
 
 namespace {
 
-/// What happens to a provider's library and to the memory that holds one text, in order. Nothing here
-/// allocates: it is asked from inside `new` and `delete`.
+/// What happens to a provider's library and to the memory that holds one text, in order. Nothing
+/// here allocates: it is asked from inside `new` and `delete`.
 struct Watch {
     char const* text = nullptr; ///< null while nobody watches
     void* blocks[64] = {};      ///< new ones that are long enough for it
@@ -53,8 +53,8 @@ void Start(std::string const& text) {
     watch.text = text.c_str();
 }
 
-/// "h" before "l": the text is held when the library is loaded. "u", "f": it is unloaded, the text's
-/// memory freed.
+/// "h" before "l": the text is held when the library is loaded. "u", "f": it is unloaded, the
+/// text's memory freed.
 std::string Stop() {
     watch.text = nullptr;
     return watch.events;

@@ -50,9 +50,9 @@ enum class EditForm {
     /// Only the lines concerned change, and a file stays as it is where none is. Its links, owner,
     /// access control list and extended attributes stay as well. A text that a model cannot read is
     /// understood as the C library and libpam read it; where a model can read the outcome, it finds
-    /// what a store would have inserted, in the same places, and a store takes it out. `Withdrawing`
-    /// takes out every copy. A text in which the readers would not all find what is inserted is
-    /// refused with a `ConfigurationError`.
+    /// what a store would have inserted, in the same places, and a store takes it out.
+    /// `Withdrawing` takes out every copy. A text in which the readers would not all find what is
+    /// inserted is refused with a `ConfigurationError`.
     Lossless
 };
 
@@ -61,8 +61,9 @@ struct PlannedFile {
     std::string path;
     std::string before;
     std::string after;
-    /// What the edit takes away beyond what it is meant to do, a sentence each: entries that would be
-    /// lost or altered, now or when the store is left again, as the C library and libpam read them.
+    /// What the edit takes away beyond what it is meant to do, a sentence each: entries that would
+    /// be lost or altered, now or when the store is left again, as the C library and libpam read
+    /// them.
     std::vector<std::string> losses;
     /// What is worth knowing and costs nothing.
     std::vector<std::string> notes;
@@ -83,8 +84,8 @@ struct TSLAUTH_EXPORT ActivationPreview {
     bool Changes() const;
 };
 
-/// What brings a host from one store to another: edits of files, in the order in which the files are
-/// written. The stores execute such plans (`ActiveDirectoryStore::GetActivationPlan`,
+/// What brings a host from one store to another: edits of files, in the order in which the files
+/// are written. The stores execute such plans (`ActiveDirectoryStore::GetActivationPlan`,
 /// `GetWithdrawalPlan`, `NoRemoteAuthenticationStore::GetActivationPlan`), so that whoever asks for
 /// one first sees what they will write, and may refuse.
 ///
@@ -98,8 +99,8 @@ public:
     /// Does nothing.
     ActivationPlan();
 
-    /// Puts a provider's entries into the PAM policy and then into the name-service switch, and then
-    /// records `store`.
+    /// Puts a provider's entries into the PAM policy and then into the name-service switch, and
+    /// then records `store`.
     static ActivationPlan Activating(ProviderEntries const& entries, std::string const& store,
                                      EditForm form = EditForm::Normalised);
 
@@ -108,7 +109,8 @@ public:
                                       EditForm form = EditForm::Normalised);
 
     /// Records `store`, and then makes the store `previous` inactive.
-    /// @param form of the files that the library's own stores edit; any other store is asked to do it
+    /// @param form of the files that the library's own stores edit; any other store is asked to do
+    ///     it
     static ActivationPlan Replacing(std::string const& previous, std::string const& store,
                                     EditForm form = EditForm::Normalised);
 

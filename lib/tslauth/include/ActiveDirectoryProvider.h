@@ -38,8 +38,8 @@ namespace authentication {
 class TSLAUTH_EXPORT ActiveDirectoryProvider {
 public:
     /// Loads the library "/usr/libexec/tslauth/lib" + `name` + ".so".
-    /// @throws IOError "Unable to open provider: " + the loader's text, if it cannot be loaded; also
-    ///     for a pipe or a device, neither of which is waited for
+    /// @throws IOError "Unable to open provider: " + the loader's text, if it cannot be loaded;
+    ///     also for a pipe or a device, neither of which is waited for
     /// @throws InvalidActiveDirectoryProviderException if it lacks one of the two records, with the
     ///     loader's text, or was written for a newer interface than this library knows; it has been
     ///     unloaded again then

@@ -31,8 +31,8 @@ namespace authentication {
 /// process, and are answered from the last answer when the provider is slower than the store's
 /// timeout. A store may be destroyed while its workers run. Activating is for one thread at a time.
 ///
-/// A process may fork while workers run: the child has none of them, keeps the last answers, and its
-/// stores ask anew, as far as the provider itself can be used in such a child.
+/// A process may fork while workers run: the child has none of them, keeps the last answers, and
+/// its stores ask anew, as far as the provider itself can be used in such a child.
 class TSLAUTH_EXPORT ActiveDirectoryStore : public DirectoryStore {
 public:
     /// Loads the provider that `provider.conf` names.
@@ -55,8 +55,8 @@ public:
     /// What the provider brings into the system files.
     ProviderEntries GetProviderEntries() const;
 
-    /// What `MakeActive` and `MakeInactive` do, to be looked at before it is done. With a form other
-    /// than theirs, it is to be executed by the caller.
+    /// What `MakeActive` and `MakeInactive` do, to be looked at before it is done. With a form
+    /// other than theirs, it is to be executed by the caller.
     ActivationPlan GetActivationPlan(EditForm form = EditForm::Normalised) const;
     ActivationPlan GetWithdrawalPlan(EditForm form = EditForm::Normalised) const;
 
@@ -107,8 +107,9 @@ public:
     /// own, at most one a question in the process besides those above; whoever finds one running
     /// waits for it within the timeout.
     /// @param timeout seconds to wait at most
-    /// @throws the provider's failure, `CallNotImplementedException` among it. Of the configuration,
-    ///     the first failure of its three fields; a field that the provider does not offer is empty
+    /// @throws the provider's failure, `CallNotImplementedException` among it. Of the
+    ///     configuration, the first failure of its three fields; a field that the provider does not
+    ///     offer is empty
     /// @throws ProviderCallTimedOutException where there is no answer in time. The worker goes on
     ///     until the provider answers
     /// @throws ThreadErrorException where no worker can be started or waited for
@@ -158,8 +159,8 @@ public:
     /// @throws InvalidHostNameException where the host's name is too long (more than 63 bytes),
     ///     does not resolve, resolves to another short name, or is one of "localhost", "linux" and
     ///     "hostname"
-    /// @throws HostCtl::Lib::HostCtlException (<strandctl/HostCtlException.h>) where the hosts file, the DNS configuration or the
-    ///     management interface cannot be read or changed
+    /// @throws HostCtl::Lib::HostCtlException (<strandctl/HostCtlException.h>) where the hosts
+    ///     file, the DNS configuration or the management interface cannot be read or changed
     /// @throws the provider's failure
     void JoinDomain(std::string const& domain, Credentials const& credentials,
                     bool skipHostnameCheck);

@@ -23,10 +23,10 @@ public:
     ~AuthenticationConfiguration() override;
 };
 
-/// The display name of the store that the host has recorded as active. It may be one that no factory
-/// knows.
-/// @throws IOError, ConfigurationError, InvalidKeyException where the file or its key is missing, or
-///     a line of it malformed
+/// The display name of the store that the host has recorded as active. It may be one that no
+/// factory knows.
+/// @throws IOError, ConfigurationError, InvalidKeyException where the file or its key is missing,
+///     or a line of it malformed
 TSLAUTH_EXPORT std::string RecordedStore();
 
 } // namespace authentication

@@ -31,15 +31,16 @@ enum class OnReadError {
 class TSLAUTH_EXPORT Configuration : public std::map<std::string, std::string> {
 public:
     /// Reads the file. An error after it was opened ends the reading and is not reported.
-    /// @throws IOError "Unable to open '" + path + "': " + the system's text; "Cannot read '" + path +
-    ///         "': it is not a regular file" for a pipe or a device, neither of which is waited for
+    /// @throws IOError "Unable to open '" + path + "': " + the system's text; "Cannot read '" +
+    ///         path + "': it is not a regular file" for a pipe or a device, neither of which is
+    ///         waited for
     /// @throws ConfigurationError as `GetKeyValuePair`, at the first bad line; lines are counted
     ///         from 1, the skipped ones included
     explicit Configuration(std::string const& path);
 
     /// The same, with a choice for who writes the file back.
-    /// @throws as above; with `OnReadError::Throw` also IOError "Cannot read '" + path + "': " + the
-    ///         reason, for an error after the file was opened and for a folder
+    /// @throws as above; with `OnReadError::Throw` also IOError "Cannot read '" + path + "': " +
+    ///         the reason, for an error after the file was opened and for a folder
     Configuration(std::string const& path, OnReadError onReadError);
     Configuration(Configuration const&) = default;
     Configuration& operator=(Configuration const&) = default;

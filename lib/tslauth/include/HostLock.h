@@ -7,14 +7,14 @@
 namespace tessel {
 namespace authentication {
 
-/// Keeps two changes of the host apart. Whoever activates stores, joins, parts or edits the library's
-/// files holds it meanwhile, in whatever process; `tslauthctl` does. The stores themselves take no
-/// lock.
+/// Keeps two changes of the host apart. Whoever activates stores, joins, parts or edits the
+/// library's files holds it meanwhile, in whatever process; `tslauthctl` does. The stores
+/// themselves take no lock.
 ///
 /// Advice among those who take it, and for root: it stands at "/run/tslauthctl.lock", where nobody
 /// else may put a file. The kernel lets go of it when the process ends, however it ends; the file
-/// stays. Two objects of one process keep each other out as those of two processes do. One object is
-/// used by one thread at a time.
+/// stays. Two objects of one process keep each other out as those of two processes do. One object
+/// is used by one thread at a time.
 class TSLAUTH_EXPORT HostLock {
 public:
     /// Opens the lock, and does not take it.

@@ -27,8 +27,8 @@ public:
     /// "None"
     std::string GetDisplayName() const override;
 
-    /// What `MakeActive` would do now, to be looked at before it is done. With a form other than its
-    /// own, it is to be executed by the caller.
+    /// What `MakeActive` would do now, to be looked at before it is done. With a form other than
+    /// its own, it is to be executed by the caller.
     /// @throws IOError, ConfigurationError, InvalidKeyException where `authentication.conf` cannot
     ///     be read
     ActivationPlan GetActivationPlan(EditForm form = EditForm::Normalised) const;

@@ -23,8 +23,8 @@ public:
 };
 
 /// The name of the provider that `provider.conf` chooses.
-/// @throws InvalidActiveDirectoryProviderException for the name "(unset)" where the file chooses none,
-///     for "(none installed)" where it cannot be opened
+/// @throws InvalidActiveDirectoryProviderException for the name "(unset)" where the file chooses
+///     none, for "(none installed)" where it cannot be opened
 /// @throws ConfigurationError where a line of the file is malformed
 TSLAUTH_EXPORT std::string ConfiguredProvider();
 

@@ -18,8 +18,8 @@ namespace tessel::authentication::ProviderModules {
 /// so.
 /// `remove`: takes every equal service out of the lines of the three, and with it a line that an
 /// insertion has added. It undoes an insertion byte for byte.
-/// @throws ConfigurationError for an insertion after which the C library, or the model if it can read
-/// the outcome, would not find the service where it belongs: in the first of two lines for a
+/// @throws ConfigurationError for an insertion after which the C library, or the model if it can
+/// read the outcome, would not find the service where it belongs: in the first of two lines for a
 /// database, say, of which the C library uses the last. Also for one into a file with a NUL byte
 std::string LosslessNSSConfiguration(std::string_view text, Edit edit,
                                      SystemConfiguration::NSSService const& service);

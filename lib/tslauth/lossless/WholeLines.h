@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
-/// What edits of texts have in common: whole lines that come and go again, so that the one undoes the
-/// other byte for byte.
+/// What edits of texts have in common: whole lines that come and go again, so that the one undoes
+/// the other byte for byte.
 namespace tessel::authentication {
 
 /// Where the line that holds the byte at `position` begins.
