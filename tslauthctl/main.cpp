@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Failures.h"
+#include "analysis/NearestName.h"
+#include "verbs/ChangeLog.h"
 #include "verbs/Verbs.h"
 
 #if defined(__GNUC__)
@@ -16,6 +18,7 @@
 #include <iostream>
 #include <limits>
 #include <unistd.h>
+#include <vector>
 
 namespace {
 
@@ -33,6 +36,7 @@ constexpr char footer[] = R"(Exit codes:
   8  timed out or unreachable
   9  credentials refused
   10 not joined
+  11 joined to another domain (join)
   A signal such as ^C ends the tool as such; a shell shows 128 and its number, 130 for ^C.
 )";
 
@@ -124,6 +128,7 @@ public:
             auto const command = Command();
             auto const unknown = command.empty() ? UnknownCommand(argc, argv) : std::string();
             error = unknown.empty() ? e.what() : "Unknown command '" + unknown + "'";
+            error += Suggestion(argc, argv);
             error += " (see tslauthctl " + (command.empty() ? "" : command + " ") + "--help)";
             return {};
         }
@@ -141,6 +146,45 @@ public:
     }
 
 private:
+    /// Of the command that was chosen so far, or of the whole tool.
+    CLI::App const& Chosen() const {
+        CLI::App const* chosen = &_app;
+        for (auto below = chosen->get_subcommands(); !below.empty();
+             below = chosen->get_subcommands()) {
+            chosen = below.front();
+        }
+        return *chosen;
+    }
+
+    /// The nearest command or option for the first argument that nobody knows; empty where there is
+    /// none.
+    std::string Suggestion(int argc, char** argv) const {
+        auto const& chosen = Chosen();
+        std::vector<std::string> commands;
+        for (auto const* command : chosen.get_subcommands(nullptr)) {
+            commands.push_back(command->get_name());
+        }
+        std::vector<std::string> options;
+        for (auto const* option : chosen.get_options(nullptr)) {
+            for (auto const& name : option->get_lnames()) {
+                options.push_back("--" + name);
+            }
+        }
+        for (int i = 1; i < argc; ++i) {
+            std::string const argument = argv[i];
+            auto const word = argument.substr(0, argument.find('='));
+            bool const isOption = word.rfind("--", 0) == 0;
+            auto const& names = isOption ? options : commands;
+            if (std::find(names.begin(), names.end(), word) != names.end()) {
+                continue;
+            }
+            if (auto const nearest = NearestName(word, names); !nearest.empty()) {
+                return "; did you mean '" + nearest + "'?";
+            }
+        }
+        return {};
+    }
+
     /// The first argument that is no option, where no command has its name.
     std::string UnknownCommand(int argc, char** argv) const {
         for (int i = 1; i < argc; ++i) {
@@ -225,6 +269,9 @@ private:
             ->type_name("OU");
         join->add_flag("--skip-hostname-check", arguments.join.skipHostnameCheck,
                        "Leave the host's name and name resolution alone");
+        join->add_flag("--dry-run", arguments.join.dryRun,
+                       "Say what was found and what would be done, and change nothing");
+        join->add_flag("-v,--verbose", arguments.join.verbose, "Tell each step");
         AddAccount(*join, arguments.join.account);
 
         auto* part = AddAsking(_app, "part", "Part the host from its domain", arguments,
@@ -385,7 +432,27 @@ bool AsksForJson(int argc, char** argv) {
     return false;
 }
 
-int Run(int argc, char** argv) {
+int End(ExitCode code, Console& console) {
+    ChangeLog::End(Word(code));
+    return console.Finish(code);
+}
+
+/// "help" and "help COMMAND ..." as if it had been "--help" and "COMMAND ... --help".
+std::vector<char*> WithHelpAsOption(int argc, char** argv) {
+    static char option[] = "--help";
+    std::vector<char*> words(argv, argv + argc);
+    if (argc > 1 && std::strcmp(argv[1], "help") == 0) {
+        words.erase(words.begin() + 1);
+        words.push_back(option);
+    }
+    return words;
+}
+
+int Run(std::vector<char*> words) {
+    int const argc = static_cast<int>(words.size());
+    char** const argv = words.data();
+    ChangeLog::SetCommand({words.begin() + 1, words.end()});
+    BeforeInterruption([] { ChangeLog::End("interrupted"); });
     Arguments arguments;
     Parser parser(arguments);
     int exitCode = 0;
@@ -406,16 +473,16 @@ int Run(int argc, char** argv) {
         return console.Finish(static_cast<ExitCode>(exitCode));
     }
     try {
-        return console.Finish(run(console));
+        return End(run(console), console);
     } catch (Failure const& e) {
         console.Error(e);
-        return console.Finish(e.Code());
+        return End(e.Code(), console);
     } catch (std::bad_alloc const& e) {
         console.Error(Failure(ExitCode::failure, e.what()));
-        return console.Finish(ExitCode::failure);
+        return End(ExitCode::failure, console);
     } catch (std::exception const& e) {
         console.Error(Refused(e));
-        return console.Finish(ExitCode::refused);
+        return End(ExitCode::refused, console);
     }
 }
 
@@ -423,7 +490,7 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     try {
-        int const exitCode = Run(argc, argv);
+        int const exitCode = Run(WithHelpAsOption(argc, argv));
         if (HasAbandonedCalls()) {
             _exit(exitCode); // everything has been written
         }

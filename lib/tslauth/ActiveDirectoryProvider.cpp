@@ -262,4 +262,10 @@ int ActiveDirectoryProvider::GetDomainTrustRelationship(std::string const& domai
     return Implemented(_operations->getDomainTrustRelationship)(domain.c_str());
 }
 
+std::string ActiveDirectoryProvider::GetLastFailure() const {
+    auto const entry = reinterpret_cast<decltype(&ActiveDirectoryClientLastFailure)>(
+        dlsym(_library.get(), "ActiveDirectoryClientLastFailure"));
+    return entry == nullptr ? std::string() : TextOrEmpty(entry());
+}
+
 } // namespace tessel::authentication

@@ -259,6 +259,10 @@ void ActiveDirectoryStore::SetPreferredDomainControllers(
     }
 }
 
+std::string ActiveDirectoryStore::GetLastFailure() const {
+    return _provider->GetLastFailure();
+}
+
 void ActiveDirectoryStore::GetStoreConfigurationInt(
     ProviderPointer provider, StatePointer state,
     boost::shared_ptr<ActiveDirectoryStoreConfiguration> cache) {

@@ -32,8 +32,7 @@
 #define JOINED STATE "/joined"                   /* this host's distinguished name; if joined */
 #define CONTROLLERS STATE "/controllers"         /* preferred controllers, one a line */
 
-/* The values of the two entries that return one. 0 means "nothing to report" in both. */
-enum { NOT_JOINED = 0, TRUSTED = 1, DIRECTORY_UNREADABLE = 2 };
+/* What getDomainTrustRelationship returns; 0 means "nothing to report". */
 enum { NO_RELATIONSHIP = 0, OWN_DOMAIN = 1 };
 
 /* ---- Files -------------------------------------------------------------------------------- */
@@ -313,9 +312,10 @@ static int GetPreferredDomainControllers(char*** controllers,
 
 static int GetDomainTrustState(void) {
     if (!IsJoined()) {
-        return NOT_JOINED;
+        return TSLAUTH_PROVIDER_TRUST_NOT_JOINED;
     }
-    return access(USERS, R_OK) == 0 ? TRUSTED : DIRECTORY_UNREADABLE;
+    return access(USERS, R_OK) == 0 ? TSLAUTH_PROVIDER_TRUST_IN_ORDER
+                                    : TSLAUTH_PROVIDER_TRUST_NO_CONTROLLER;
 }
 
 /* The one domain, in one block again; its names are constants and need no releasing. */

@@ -68,6 +68,14 @@ static int PlayCode(char const* entry) {
     return code;
 }
 
+char const* ActiveDirectoryClientLastFailure(void) {
+    static char text[128];
+    char* const script = Script("last-failure");
+    (void)snprintf(text, sizeof text, "%s", script == NULL ? "" : script); /* it may be cut */
+    free(script);
+    return text;
+}
+
 static int JoinDomain(char const* domain, char const* organisationalUnit,
                       ActiveDirectoryClientCredentials const* credentials) {
     (void)domain, (void)organisationalUnit, (void)credentials;

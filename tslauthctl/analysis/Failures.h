@@ -4,6 +4,8 @@
 
 #include "terminal/Console.h"
 
+#include <tslauth/Exceptions.h>
+
 #include <exception>
 #include <new>
 
@@ -36,6 +38,23 @@ template <typename Call> auto Explaining(Account account, Call call) {
         throw Failure(ExitCodeOf(e, account), e.what(), ClassName(e));
     } catch (...) {
         throw Failure(ExitCode::refused, "The provider failed in a way of its own");
+    }
+}
+
+/// Runs a call to the domain on this thread, and adds to its failure why the provider failed, in the
+/// provider's words.
+/// @param domain a store or a provider
+template <typename Domain, typename Call>
+auto WithCause(Domain const& domain, Account account, Call call) {
+    try {
+        return call();
+    } catch (authentication::Exception const& e) {
+        auto const cause = domain.GetLastFailure();
+        if (cause.empty()) {
+            throw;
+        }
+        throw Failure(ExitCodeOf(e, account), std::string(e.what()) + " (" + cause + ")",
+                      ClassName(e));
     }
 }
 

@@ -29,6 +29,8 @@ using Clock = std::chrono::steady_clock;
 /// Workers that have not ended.
 std::atomic<int> running{0};
 
+std::function<void()> beforeInterruption;
+
 } // namespace
 
 /// What the worker shares with who waits for it.
@@ -168,12 +170,19 @@ void Wait(Console& console, Pending const& pending) {
     console.EndProgress();
     if (int const signal = watch.Stop(); signal != 0) {
         console.Interrupted("interrupted while waiting for " + pending.what);
+        if (beforeInterruption) {
+            beforeInterruption();
+        }
         End(signal);
     }
     if (!done) {
         Expire(console, pending);
     }
     pending.work->Result();
+}
+
+void BeforeInterruption(std::function<void()> act) {
+    beforeInterruption = std::move(act);
 }
 
 bool HasAbandonedCalls() noexcept {

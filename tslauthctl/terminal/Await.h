@@ -68,6 +68,9 @@ template <typename Call> auto Ask(Console& console, std::string what, Limit limi
     return AnswerTo(console, StartAsking(std::move(what), limit, std::move(call)));
 }
 
+/// Runs `act` right before a signal ends the process in `Wait`.
+void BeforeInterruption(std::function<void()> act);
+
 /// Whether a call was given up and may still run: the process must then end without running
 /// destructors, which would pull the provider away from under it.
 bool HasAbandonedCalls() noexcept;

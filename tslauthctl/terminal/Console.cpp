@@ -91,6 +91,8 @@ char const* Word(ExitCode code) {
         return "credentials";
     case ExitCode::notJoined:
         return "not-joined";
+    case ExitCode::joinedElsewhere:
+        return "joined-elsewhere";
     }
     return "failure";
 }
@@ -153,6 +155,12 @@ void Console::Waiting(std::string_view text) {
     if (!_json) {
         // Nothing depends on it.
         (void)WriteAll(STDERR_FILENO, "tslauthctl: " + Escaped(text) + "\n");
+    }
+}
+
+void Console::Detail(std::string_view text) {
+    if (_details) {
+        Waiting(text);
     }
 }
 

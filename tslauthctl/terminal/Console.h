@@ -22,7 +22,8 @@ enum class ExitCode {
     changes = 7,
     unreachable = 8,
     credentials = 9,
-    notJoined = 10
+    notJoined = 10,
+    joinedElsewhere = 11
 };
 
 /// The word for an exit code, as it stands in the JSON document.
@@ -66,6 +67,13 @@ public:
     /// A unified diff.
     void Diff(std::string_view text);
 
+    /// One step of a command, at once, to the error stream, if people read it and `ShowDetails` has
+    /// been asked for.
+    void Detail(std::string_view text);
+    void ShowDetails(bool show) noexcept {
+        _details = show;
+    }
+
     /// At once, to the error stream, if people read it: why nothing happens.
     void Waiting(std::string_view text);
 
@@ -96,6 +104,7 @@ private:
     bool _json;
     bool _colour;
     bool _progress = false;
+    bool _details = false;
     std::string _text;
     std::string _errors;
     nlohmann::json _document;

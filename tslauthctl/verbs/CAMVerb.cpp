@@ -37,7 +37,7 @@ ExitCode RunCAMImport(std::string const& server, std::string const& file, Limit 
     auto const store = OpenStore(limit);
     HostChange const change(console);
     auto const before = PinnedFor(server);
-    Explaining(Account::none, [&] { store->ImportCertificateForCAM(file, server); });
+    Explaining(Account::none, [&] { store->PinCertificateForCAM(file, server); });
     auto const now = PinnedFor(server);
     document["thumbprint"] = now;
     console.Line("pinned for " + server + ": " + now);

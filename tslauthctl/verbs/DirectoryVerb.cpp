@@ -23,8 +23,9 @@ ExitCode TellName(std::string const& domain, std::string const& whose, char cons
     document[field] = nullptr;
     auto const store = OpenStore(limit);
     auto const answer = Explaining(Account::none, [&] {
-        return Ask(console, "the provider to name " + whose, limit,
-                   [store, domain, question] { return question(*store, domain); });
+        return Ask(console, "the provider to name " + whose, limit, [store, domain, question] {
+            return WithCause(*store, Account::none, [&] { return question(*store, domain); });
+        });
     });
     if (answer.empty()) {
         throw Failure(ExitCode::refused, "The provider does not name " + whose);
@@ -60,8 +61,10 @@ ExitCode RunCanonical(std::string const& name, Limit limit, Console& console) {
     document["canonical"] = nullptr;
     auto const store = OpenStore(limit);
     auto const canonical = Explaining(Account::none, [&] {
-        return Ask(console, "the provider to convert the name of a user", limit,
-                   [store, name] { return store->ConvertCanonicalUsername(name); });
+        return Ask(console, "the provider to convert the name of a user", limit, [store, name] {
+            return WithCause(*store, Account::none,
+                             [&] { return store->ConvertCanonicalUsername(name); });
+        });
     });
     document["canonical"] = canonical;
     console.Line(canonical);
@@ -92,9 +95,11 @@ ExitCode RunSetPreferredDCs(std::vector<std::string> const& controllers, Console
     std::deque<std::string> const list(controllers.begin(), controllers.end());
     HostChange const change(console);
     Explaining(Account::none, [&] {
-        Wait(console,
-             Start("the provider to take the list of preferred domain controllers", std::nullopt,
-                   [provider, list] { provider->SetPreferredDomainControllers(list); }));
+        Wait(console, Start("the provider to take the list of preferred domain controllers",
+                            std::nullopt, [provider, list] {
+                                WithCause(*provider, Account::none,
+                                          [&] { provider->SetPreferredDomainControllers(list); });
+                            }));
     });
     document["controllers"] = controllers;
     console.Line(controllers.empty() ? "No domain controller is preferred any more."

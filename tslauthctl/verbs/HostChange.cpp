@@ -2,6 +2,7 @@
 #include "verbs/HostChange.h"
 
 #include "terminal/Console.h"
+#include "verbs/ChangeLog.h"
 
 #include <tslauth/Exceptions.h>
 
@@ -15,6 +16,7 @@ HostChange::HostChange(Console& console) try {
         console.Waiting("waiting for another tslauthctl to finish ...");
         _lock.Lock();
     }
+    ChangeLog::Begin();
 } catch (authentication::IOError const& e) {
     throw Failure(ExitCode::failure, e.what());
 }

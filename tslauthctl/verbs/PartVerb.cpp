@@ -13,13 +13,15 @@ namespace {
 std::function<void()> PartCall(AccountArguments const& arguments, Limit limit) {
     auto const store = OpenStore(limit);
     if (!arguments.user) {
-        return [store] { store->PartDomain(); };
+        return [store] { WithCause(*store, Account::none, [&] { store->PartDomain(); }); };
     }
     auto const password = std::make_shared<Secret>();
     ReadPassword(arguments.password, "Password of '" + *arguments.user + "': ", *password);
     return [store, user = *arguments.user, password] {
         LastUse const lastUse(*password);
-        store->PartDomain({user.c_str(), password->Text()});
+        WithCause(*store, Account::given, [&] {
+            store->PartDomain({user.c_str(), password->Text()});
+        });
     };
 }
 

@@ -57,6 +57,8 @@ struct JoinArguments {
     std::string unit;
     AccountArguments account;
     bool skipHostnameCheck = false;
+    bool dryRun = false;
+    bool verbose = false;
 };
 
 ExitCode RunJoin(JoinArguments const& arguments, Limit limit, Console& console);

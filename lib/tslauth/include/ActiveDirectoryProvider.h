@@ -109,6 +109,11 @@ public:
     /// The relationship between the host's domain and `domain`, as the provider numbers it.
     int GetDomainTrustRelationship(std::string const& domain) const;
 
+    /// Why the last operation that failed on this thread did so, in the provider's own words, which
+    /// say more than a code can; empty where the provider does not tell. To be asked for before
+    /// anything else is asked of the provider on this thread. Does not block.
+    std::string GetLastFailure() const;
+
 private:
     void CacheMetadata();
 

@@ -232,6 +232,10 @@ public:
     /// @throws what `CAMProxy`'s operations throw
     std::string GetDomainForCAMService(std::string const& serverAddress) const;
 
+    /// Why the last of the provider's operations that failed on this thread did so, in the provider's
+    /// own words; empty where it does not tell. Not for the questions that run on workers.
+    std::string GetLastFailure() const;
+
 private:
     typedef boost::shared_ptr<ActiveDirectoryProvider> ProviderPointer;
     typedef boost::shared_ptr<RequestState> StatePointer;

@@ -6,7 +6,7 @@
  * What an Active Directory provider implements: a shared library in C (or with C linkage),
  * installed as /usr/libexec/tslauth/lib<name>.so and named by the key "provider" of
  * /etc/tessel/tslauth/provider.conf. It exports two data records, which stand at the end of this
- * file; everything else about it is its own.
+ * file, and a function if it likes; everything else about it is its own.
  *
  * Loading. The library is opened with RTLD_LAZY and stays loaded as long as an adapter lives; it
  * may be opened several times in a process. Both records belong to the provider and are never
@@ -102,6 +102,19 @@ enum {
     TSLAUTH_PROVIDER_TIMED_OUT = 10060                 /* WSATimedOutException */
 };
 
+/* The state of a host's trust in its domain, as getDomainTrustState returns it. Tools show each by
+ * these words; a provider may return other numbers of its own, which are shown as such. */
+enum {
+    TSLAUTH_PROVIDER_TRUST_IN_ORDER = 0,
+    TSLAUTH_PROVIDER_TRUST_SECRET_REFUSED = 1,
+    TSLAUTH_PROVIDER_TRUST_NO_CONTROLLER = 2,
+    TSLAUTH_PROVIDER_TRUST_SERVICE_NOT_RUNNING = 3,
+    TSLAUTH_PROVIDER_TRUST_SERVICE_NOT_ANSWERING = 4,
+    TSLAUTH_PROVIDER_TRUST_UNKNOWN = 5,
+    TSLAUTH_PROVIDER_TRUST_CLOCKS_APART = 6,
+    TSLAUTH_PROVIDER_TRUST_NOT_JOINED = 7
+};
+
 /* Releases what a provider handed out. A provider that hands out memory of its own, static or
  * shared, may leave the pointer to this function null: then nothing is called. */
 typedef void (*ActiveDirectoryClientFreeFunction)(void* memory);
@@ -157,7 +170,11 @@ typedef struct ActiveDirectoryClientMetadataRecord {
     /* Name of the name service, as nsswitch.conf(5) takes it. Never null. */
     char const* nssModule;
 
-    /* Its parameters, separated by white space; there is no quoting. May be null: none. */
+    /* Its parameters, separated by white space; there is no quoting. May be null: none. Leave it
+     * null: they are written as "[" + parameters + "]" behind the name, which to the C library are
+     * actions of that service, and the library's reader passes over the services behind a bracket.
+     * So an activation that is repeated or taken back drops "files" from "passwd", and with it every
+     * local user; tslauthctl refuses such a provider. */
     char const* nssModuleParameters;
 } ActiveDirectoryClientMetadataRecord;
 
@@ -248,8 +265,15 @@ typedef struct ActiveDirectoryClientOperationsRecord {
     int (*getDomainTrustRelationship)(char const* domain);
 } ActiveDirectoryClientOperationsRecord;
 
-/* The two symbols that a provider defines. Include this header where they are defined: it gives
- * them their linkage and their visibility, and the compiler checks them. Neither may be missing. */
+/* A third symbol, which a provider may define: why the last entry that failed on the calling thread
+ * did so, in words for an administrator; what a code cannot say, such as the name of a unit that
+ * does not exist. Never a secret. The text belongs to the provider, and is valid until the thread's
+ * next call to it; null or empty where there is nothing to tell. Asked for by its name alone, so
+ * that it belongs to no version, and a provider without it is as good as before. */
+extern TSLAUTH_PROVIDER_EXPORT char const* ActiveDirectoryClientLastFailure(void);
+
+/* The two symbols that a provider must define. Include this header where they are defined: it gives
+ * them their linkage and their visibility, and the compiler checks them. */
 extern TSLAUTH_PROVIDER_EXPORT ActiveDirectoryClientMetadataRecord const
     ActiveDirectoryClientMetadata;
 extern TSLAUTH_PROVIDER_EXPORT ActiveDirectoryClientOperationsRecord const

@@ -43,9 +43,16 @@ char* Append(std::string const& text, char** end) {
     return start;
 }
 
+thread_local std::string lastFailure;
+
 ActiveDirectoryClientErrorCode Report(char const* entry, ActiveDirectoryClientErrorCode code,
                                       char const* text) {
     syslog(LOG_WARNING, "winbind: %s: %s", entry, text);
+    try {
+        lastFailure = text;
+    } catch (std::bad_alloc const&) {
+        lastFailure.clear(); // the code is all there is to tell
+    }
     if (code == TSLAUTH_PROVIDER_SUCCESS) {
         return TSLAUTH_PROVIDER_INTERNAL_ERROR; // the caller must not take it for a success
     }
@@ -67,6 +74,10 @@ ActiveDirectoryClientErrorCode ReportFailure(char const* entry,
     } catch (...) {
         return Report(entry, TSLAUTH_PROVIDER_INTERNAL_ERROR, "an exception of no known class");
     }
+}
+
+char const* LastFailure() noexcept {
+    return lastFailure.c_str();
 }
 
 void HandOut(std::string const& text, char** slot, ActiveDirectoryClientFreeFunction* release) {

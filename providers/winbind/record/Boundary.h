@@ -16,6 +16,9 @@ namespace tessel::winbind {
 ActiveDirectoryClientErrorCode ReportFailure(char const* entry,
                                              std::exception_ptr const& failure) noexcept;
 
+/// The words of the last failure that this thread has reported; empty where there was none.
+char const* LastFailure() noexcept;
+
 /// Runs an entry that returns a code: 0, or what its failure means.
 template <typename Body> int CodeOf(char const* entry, Body&& body) noexcept {
     try {

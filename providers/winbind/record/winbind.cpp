@@ -157,4 +157,8 @@ ActiveDirectoryClientOperationsRecord const ActiveDirectoryClientOperations = {
     &GetDomainTrustRelationshipEntry,
 };
 
+char const* ActiveDirectoryClientLastFailure() {
+    return LastFailure();
+}
+
 } // extern "C"
