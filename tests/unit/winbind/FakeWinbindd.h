@@ -19,7 +19,10 @@
 #include <thread>
 #include <unistd.h>
 #include <vector>
+
+extern "C" { // it does not say so itself
 #include <wbclient.h>
+}
 
 /// libwbclient takes the socket's folder from the environment in a program that exports the first of
 /// these, and a folder that is not root's in one that exports the second: the wrappers of Samba's own
