@@ -203,7 +203,8 @@ void WinbindDaemon::Reload() const noexcept {
 void WinbindDaemon::CheckTrust(Clock::time_point deadline) const {
     // A controller that has not heard of a new secret yet hears of it soon, or another one is asked.
     auto const certain = std::min(deadline, Clock::now() + refusalPatience);
-    for (;;) {
+    // Soon at first: it takes winbindd a moment to find its controller.
+    for (auto wait = pause;; wait = std::min(2 * wait, longPause)) {
         try {
             WinbindClient(deadline).CheckTrustCredentials();
             return;
@@ -211,11 +212,11 @@ void WinbindDaemon::CheckTrust(Clock::time_point deadline) const {
             bool const isRefused = e.Code() == TSLAUTH_PROVIDER_LOGON_FAILURE ||
                                    e.Code() == TSLAUTH_PROVIDER_ACCESS_DENIED ||
                                    e.Code() == TSLAUTH_PROVIDER_NO_TRUST_SAM_ACCOUNT;
-            if (Clock::now() + longPause >= (isRefused ? certain : deadline)) {
+            if (Clock::now() + wait >= (isRefused ? certain : deadline)) {
                 throw;
             }
         }
-        std::this_thread::sleep_for(longPause);
+        std::this_thread::sleep_for(wait);
     }
 }
 

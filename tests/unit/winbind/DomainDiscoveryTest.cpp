@@ -38,29 +38,7 @@ ActiveDirectoryClientErrorCode CodeOf(std::function<void()> const& operation) {
     }
 }
 
-TEST(DomainDiscoveryTest, KnowsTheNamesOfControllers) {
-    ControllerAnswer answer;
-    answer.computer = "DC1";
-    std::vector<std::string> const others = {"dc1.corp.example", "dc2.corp.example",
-                                             "a-longer-name-than-fits.corp.example"};
-    for (char const* const name : {"DC1", "DC2", "A-LONGER-NAME-T"}) {
-        EXPECT_TRUE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
-    }
-    for (char const* const name : {"DC", "DC11", "DC2.CORP", "A-LONGER-NAME-TH"}) {
-        EXPECT_FALSE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
-    }
-    EXPECT_TRUE(DomainDiscovery::IsNameOfController("DC1", answer, {}));
-}
-
-TEST(DomainDiscoveryTest, KeepsAHostOffAControllersNameInATurkishLocaleAsWell) {
-    ControllerAnswer answer;
-    answer.computer = "INTERNAL";
-    EXPECT_TRUE(DomainDiscovery::IsNameOfController("internal", answer, {}));
-    answer.computer = "DC1";
-    EXPECT_TRUE(DomainDiscovery::IsNameOfController("LONDON-I", answer, {"london-i.corp.example"}));
-}
-
-class DiscoveryTest : public testing::Test {
+class DomainDiscoveryTest : public testing::Test {
 protected:
     ActiveDirectoryClientErrorCode CodeOfFinding(std::vector<std::string> const& preferred = {}) {
         return CodeOf([&] {
@@ -75,24 +53,46 @@ protected:
     ControllerAnswer found;
 };
 
-TEST_F(DiscoveryTest, APreferredControllerIsAskedBeforeDNS) {
+TEST_F(DomainDiscoveryTest, KnowsTheNamesOfControllers) {
+    ControllerAnswer answer;
+    answer.computer = "DC1";
+    std::vector<std::string> const others = {"dc1.corp.example", "dc2.corp.example",
+                                             "a-longer-name-than-fits.corp.example"};
+    for (char const* const name : {"DC1", "DC2", "A-LONGER-NAME-T"}) {
+        EXPECT_TRUE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
+    }
+    for (char const* const name : {"DC", "DC11", "DC2.CORP", "A-LONGER-NAME-TH"}) {
+        EXPECT_FALSE(DomainDiscovery::IsNameOfController(name, answer, others)) << name;
+    }
+    EXPECT_TRUE(DomainDiscovery::IsNameOfController("DC1", answer, {}));
+}
+
+TEST_F(DomainDiscoveryTest, KeepsAHostOffAControllersNameInATurkishLocaleAsWell) {
+    ControllerAnswer answer;
+    answer.computer = "INTERNAL";
+    EXPECT_TRUE(DomainDiscovery::IsNameOfController("internal", answer, {}));
+    answer.computer = "DC1";
+    EXPECT_TRUE(DomainDiscovery::IsNameOfController("LONDON-I", answer, {"london-i.corp.example"}));
+}
+
+TEST_F(DomainDiscoveryTest, APreferredControllerIsAskedBeforeDNS) {
     EXPECT_EQ(0U, CodeOfFinding({"dc9.corp.example"}));
     EXPECT_THAT(host.State().log, HasSubstr("ads lookup -S dc9.corp.example"));
     EXPECT_THAT(host.State().log, testing::Not(HasSubstr("DNS")));
 }
 
-TEST_F(DiscoveryTest, OneThatDoesNotAnswerIsPassedOver) {
+TEST_F(DomainDiscoveryTest, OneThatDoesNotAnswerIsPassedOver) {
     host.FailAt(1, Fault::TimedOut);
     EXPECT_EQ(0U, CodeOfFinding({"dc9.corp.example"}));
     EXPECT_EQ("dc1.corp.example", found.controller);
 }
 
-TEST_F(DiscoveryTest, WhereNoneAnswersThatIsTold) {
+TEST_F(DomainDiscoveryTest, WhereNoneAnswersThatIsTold) {
     host.FailAt(2, Fault::TimedOut);
     EXPECT_EQ(TSLAUTH_PROVIDER_NO_LOGON_SERVERS, CodeOfFinding());
 }
 
-TEST_F(DiscoveryTest, AControllerOfAnotherDomainIsNone) {
+TEST_F(DomainDiscoveryTest, AControllerOfAnotherDomainIsNone) {
     auto const code = CodeOf([&] {
         (void)DomainDiscovery::FindController(host, tools, "other.example", {"dc1.corp.example"},
                                               Clock::now() + std::chrono::minutes(1));
@@ -100,7 +100,7 @@ TEST_F(DiscoveryTest, AControllerOfAnotherDomainIsNone) {
     EXPECT_EQ(TSLAUTH_PROVIDER_NO_SUCH_DOMAIN, code);
 }
 
-TEST_F(DiscoveryTest, AHostWithTheNameOfAControllerIsRefusedAlsoWhenDNSIsSilent) {
+TEST_F(DomainDiscoveryTest, AHostWithTheNameOfAControllerIsRefusedAlsoWhenDNSIsSilent) {
     ControllerAnswer answer;
     answer.computer = "DC1";
     host.FailAt(1, Fault::TimedOut);
@@ -110,7 +110,7 @@ TEST_F(DiscoveryTest, AHostWithTheNameOfAControllerIsRefusedAlsoWhenDNSIsSilent)
         0U, CodeOf([&] { DomainDiscovery::CheckHostName(host, "NODE", answer, "corp.example"); }));
 }
 
-TEST_F(DiscoveryTest, ClocksThatAreTooFarApartAreRefused) {
+TEST_F(DomainDiscoveryTest, ClocksThatAreTooFarApartAreRefused) {
     auto const check = [&] {
         return CodeOf([&] {
             (void)DomainDiscovery::CheckClock(tools, "dc1", Clock::now() + std::chrono::minutes(1));

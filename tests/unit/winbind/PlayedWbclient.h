@@ -1,14 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "samba/WinbindClient.h"
+
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <iterator>
 #include <map>
 #include <pwd.h>
 #include <string>
 #include <utility>
 #include <vector>
-#include <wbclient.h>
 
 /// What winbindd answers to this program, whose libwbclient is this file: its functions stand before
 /// the library's. For one test file a program.
@@ -71,8 +74,8 @@ wbcErr wbcCtxPing(wbcContext*) {
     return PlayedWinbindd::Here().ping;
 }
 
-wbcErr wbcCtxInterfaceDetails(wbcContext*, wbcInterfaceDetails** details) {
-    *details = played::Make<wbcInterfaceDetails>();
+wbcErr wbcCtxInterfaceDetails(wbcContext*, struct wbcInterfaceDetails** details) {
+    *details = played::Make<struct wbcInterfaceDetails>();
     (*details)->netbios_name = played::Copy("NODE");
     (*details)->netbios_domain = played::Copy("CORP");
     (*details)->dns_domain = played::Copy("corp.example");
@@ -86,9 +89,9 @@ wbcErr wbcCtxCheckTrustCredentials(wbcContext*, char const*, wbcAuthErrorInfo** 
     return PlayedWinbindd::Here().trust;
 }
 
-wbcErr wbcCtxListTrusts(wbcContext*, wbcDomainInfo** domains, size_t* count) {
+wbcErr wbcCtxListTrusts(wbcContext*, struct wbcDomainInfo** domains, size_t* count) {
     auto const& known = PlayedWinbindd::Here().domains;
-    *domains = played::Make<wbcDomainInfo>(known.size() + 1);
+    *domains = played::Make<struct wbcDomainInfo>(known.size() + 1);
     *count = known.size();
     for (std::size_t i = 0; i < known.size(); ++i) {
         (*domains)[i].short_name = played::Copy(known[i].netBIOSName);
@@ -122,7 +125,7 @@ wbcErr wbcCtxLookupName(wbcContext*, char const* domain, char const* name, wbcDo
     if (found == here.users.end()) {
         return WBC_ERR_DOMAIN_NOT_FOUND;
     }
-    sid->num_auths = static_cast<std::int8_t>(std::distance(here.users.begin(), found));
+    sid->num_auths = static_cast<std::uint8_t>(std::distance(here.users.begin(), found));
     *type = WBC_SID_NAME_USER;
     return WBC_ERR_SUCCESS;
 }

@@ -3,6 +3,7 @@
 
 #include "../../MappedCodes.h"
 #include "GoldenText.h"
+#include "tslauth_winbind_provider.h"
 
 #include <gtest/gtest.h>
 
