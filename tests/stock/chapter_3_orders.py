@@ -8,7 +8,7 @@ TITLE = "Debian 12: every order of packages while \"Active Directory\" is active
 
 def is_safe(host):
     host.locals_are_well()
-    host.wrong_passwords_are_refused()
+    host.wrong_password_is_refused()
 
 
 def is_none(host):
