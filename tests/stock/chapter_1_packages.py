@@ -41,6 +41,9 @@ def play(lab):
     with lab.step("local users log in as before"):
         host.locals_are_well()
         host.wrong_passwords_are_refused()
+    with lab.step("what keeps the policy is enabled and waits"):
+        host.ok("systemctl", "is-enabled", "tslauth-policy.service", "tslauth-policy.path")
+        host.ok("systemctl", "is-active", "tslauth-policy.path")
     with lab.step("dpkg --verify finds nothing"):
         host.verifies()
     with lab.step("the folder of the policy's module paths leads to libpam's modules"):

@@ -39,9 +39,8 @@ def play(lab):
             expect_equal(host.store(), "Active Directory", "the record")
             host.follows()
     with lab.step("ours are upgraded: the store stays active, local users log in"):
-        host.dpkg("-i", *(host.newer(name) for name in ("libstrandctl1", "libtslauth1")))
-        host.dpkg("-i", "--force-depends", *(host.newer(name) for name in
-                                             ("tslauthctl", "tslauth-provider-winbind")))
+        host.dpkg("-i", *(host.newer(name) for name in (
+            "libstrandctl1", "libtslauth1", "tslauthctl", "tslauth-provider-winbind")))
         expect(host.is_active(), "it is active no longer")
         expect_equal(host.store(), "Active Directory", "the record")
         host.follows()

@@ -22,7 +22,8 @@ def give_key(host, user):
         echo 'AuthorizedKeysFile .ssh/authorized_keys /etc/ssh/keys/%u' >/etc/ssh/sshd_config.d/keys.conf
         install -d -m 0755 /etc/ssh/keys
         install -m 0644 "$key.pub" "/etc/ssh/keys/$1"
-        systemctl reload ssh""", user)
+        systemctl reload ssh
+        until { : </dev/tcp/localhost/22; } 2>/dev/null; do sleep 0.1; done""", user)
     return "/root/domain"
 
 

@@ -2,6 +2,7 @@
 """A stock Debian host for the statements: commands in it, log-ins as a person makes them, apt."""
 import json
 import os
+import re
 import subprocess
 import sys
 
@@ -92,7 +93,11 @@ class StockHost(Node):
                 apt-get -q download "$1" >/dev/null 2>&1; file=$(ls "$PWD/$1"_*.deb | head -n 1)
             fi
             dpkg-deb -R "$file" root
-            sed -i 's/^Version: .*/&+later/; s/\(= [^)]*\))/\1)/' root/DEBIAN/control
+            sed -i 's/^Version: .*/&+later/' root/DEBIAN/control
+            # Ours ask for each other's very version.
+            case $1 in
+                *tslauth* | libstrandctl1) sed -i 's/(= \([^)]*\))/(= \1+later)/' root/DEBIAN/control ;;
+            esac
             dpkg-deb -b -Znone root "/srv/newer/later-$1.deb" >/dev/null
             echo "/srv/newer/later-$1.deb"
             """, name).out.strip()
@@ -156,7 +161,7 @@ class StockHost(Node):
     def becomes(self, user, target, password):
         """Whether su lets a user become another one with a password, and what it said."""
         return self._asks(self.terminal("runuser", "-u", user, "--", "su", target, "-c", "echo now=$(id -un)"),
-                          [password], f"now={target}")
+                          [password], re.escape(f"now={target}"))
 
     def sudoes(self, user, password):
         """Whether sudo lets a user be root with a password, and what it said."""
