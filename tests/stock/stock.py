@@ -236,7 +236,7 @@ class StockHost(Node):
     def store(self):
         """What is recorded; None where nothing is."""
         result = self.run("tslauthctl", "--json", "status")
-        return json.loads(result.out).get("store") if result.out else None
+        return json.loads(result.out).get("recorded") if result.out else None
 
     def is_active(self):
         """The provider's entries are in the policy and in the name-service switch."""
