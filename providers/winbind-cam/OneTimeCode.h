@@ -16,12 +16,13 @@ public:
 
     /// @return the code, without the white space around it
     /// @throws Failure NoCodeOnThisHost where the file is missing or empty, CodeNotProtected where
-    ///         it is no regular file or others than its owner, who is the caller's user, may read or
-    ///         write it, InvalidParameter where it holds no code, Unknown where it cannot be read
+    ///         it is no regular file or others than its owner, who is the caller's user, may read
+    ///         or write it, InvalidParameter where it holds no code, Unknown where it cannot be
+    ///         read
     SecretText Read() const;
 
-    /// Overwrites the file with zeros and removes it. What a journal, a snapshot or the spare blocks
-    /// of a flash disk keep of it is out of reach; the service takes no code twice.
+    /// Overwrites the file with zeros and removes it. What a journal, a snapshot or the spare
+    /// blocks of a flash disk keep of it is out of reach; the service takes no code twice.
     /// @throws Failure Unknown where the file is still there afterwards
     void Spend() const;
 

@@ -44,7 +44,8 @@ std::string Thumbprint(X509 const* certificate) {
 }
 
 void UseAuthorities(SSL_CTX* context, std::string const& file) {
-    // An authority of one's own replaces the system's: nobody else's may then vouch for the service.
+    // An authority of one's own replaces the system's: nobody else's may then vouch for the
+    // service.
     struct stat status = {};
     bool const hasFile = !file.empty() && stat(file.c_str(), &status) == 0;
     if (hasFile && !S_ISREG(status.st_mode)) { // a pipe would be waited for

@@ -44,8 +44,9 @@ public:
     void Send(std::string_view text);
 
     /// The two lines of an answer, with their ends.
-    /// @throws Failure ConnectionInvalid where the server ends before the second line does, TimedOut,
-    ///         InvalidAnswer where more than `limit` bytes come, or any behind the second line
+    /// @throws Failure ConnectionInvalid where the server ends before the second line does,
+    ///         TimedOut, InvalidAnswer where more than `limit` bytes come, or any
+    ///         behind the second line
     SecretText ReceiveTwoLines(std::size_t limit);
 
 private:

@@ -69,8 +69,8 @@ void CreateAccount(char const* server, Trust const& trust, char const* accountNa
                           " and certificates are not verified: it gets no one-time code");
     }
     std::string const request = AccountRequest(accountName, organisationalUnit);
-    // The provider `winbind` would refuse later, with the code spent and the account made anew: that
-    // of a host that is joined would be broken by it.
+    // The provider `winbind` would refuse later, with the code spent and the account made anew:
+    // that of a host that is joined would be broken by it.
     DomainJoin::RequireJoinable(ThisHost());
     OneTimeCode const code(Paths::OneTimeCode);
     SecretText const text = code.Read();

@@ -46,7 +46,8 @@ public:
 
     /// Blocks until the program has ended, `deadline` at the latest. What a daemon writes later is
     /// not waited for.
-    /// @throws Failure 1060 if there is no such program, `TSLAUTH_WINBIND_SEE_SYSTEM_LOG` where none can be started
+    /// @throws Failure 1060 if there is no such program, `TSLAUTH_WINBIND_SEE_SYSTEM_LOG` where
+    ///         none can be started
     static Outcome Run(Task const& task, Clock::time_point deadline);
 
     /// The program's path, or empty where it is not installed.

@@ -47,8 +47,8 @@ public:
     /// Takes back what was not kept.
     ~HostChanges();
 
-    /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner, mode, access
-    /// control list and other extended attributes, and a link to it stays a link.
+    /// Replaces a file, or makes it, whole and durable. One that exists keeps its owner, mode,
+    /// access control list and other extended attributes, and a link to it stays a link.
     /// @param mode for a new file
     /// @throws Failure, and the file is as it was; also where the path is a link to nothing
     void Replace(std::string const& path, std::string const& text, mode_t mode);
@@ -56,8 +56,8 @@ public:
     /// Removes a file, if there is one.
     void Remove(std::string const& path);
 
-    /// Makes a file that is there until the changes are kept or taken back: who finds it later knows
-    /// that a process has died in between, and reads in `text` what that one was about.
+    /// Makes a file that is there until the changes are kept or taken back: who finds it later
+    /// knows that a process has died in between, and reads in `text` what that one was about.
     /// @throws Failure
     void Mark(std::string const& path, std::string const& text);
 

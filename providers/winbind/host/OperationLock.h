@@ -14,7 +14,8 @@ class OperationLock {
 public:
     /// Waits its turn.
     /// @param path of the file that is locked; it is there as long as the lock
-    /// @throws Failure 10060 at the deadline, 5 where this is not root, otherwise `TSLAUTH_WINBIND_SEE_SYSTEM_LOG`
+    /// @throws Failure 10060 at the deadline, 5 where this is not root, otherwise
+    ///         `TSLAUTH_WINBIND_SEE_SYSTEM_LOG`
     OperationLock(std::string path, Clock::time_point deadline);
     OperationLock(OperationLock const&) = delete;
     OperationLock& operator=(OperationLock const&) = delete;

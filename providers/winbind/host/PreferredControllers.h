@@ -7,8 +7,8 @@
 
 namespace tessel::winbind {
 
-/// Whether `name` is a host's DNS name or an address: of letters, digits, ".", "-", "_" and ":", and
-/// nothing that a program would take for an option.
+/// Whether `name` is a host's DNS name or an address: of letters, digits, ".", "-", "_" and ":",
+/// and nothing that a program would take for an option.
 bool IsControllerName(std::string_view name);
 
 /// The controllers to ask first, in a file of the library's format that no join or part touches.

@@ -51,8 +51,8 @@ public:
         return _path + "/krb5.conf";
     }
 
-    /// Removes the folders of operations that did not end. One that is in use, a question's for one,
-    /// is held by its user and stays.
+    /// Removes the folders of operations that did not end. One that is in use, a question's for
+    /// one, is held by its user and stays.
     static void RemoveLeftOvers(std::string const& pattern) noexcept;
 
 private:

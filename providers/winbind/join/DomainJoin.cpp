@@ -118,7 +118,8 @@ void RequireNotJoined(Host const& host, SambaFolders const& folders, Clock::time
     }
 }
 
-/// Phase 1: the host alone. Puts in order what an earlier operation has left, short of a membership.
+/// Phase 1: the host alone. Puts in order what an earlier operation has left, short of a
+/// membership.
 FreeHost LookAtHost(Host const& host, Order const& order) {
     RequirePrograms(host);
     SambaFolders folders = ReadSambaFolders(host, order.deadline);
@@ -172,8 +173,8 @@ LocalMembership::Secrets SecretsIn(StagingFolder const& staging, SambaTools cons
     return secrets;
 }
 
-/// Whether a failure may have come after the controller had made the account. What it says of names,
-/// rights and passwords comes before.
+/// Whether a failure may have come after the controller had made the account. What it says of
+/// names, rights and passwords comes before.
 bool MayComeFromTheMiddle(ActiveDirectoryClientErrorCode code) {
     return code == TSLAUTH_WINBIND_SEE_SYSTEM_LOG || code == TSLAUTH_PROVIDER_TIMED_OUT ||
            code == TSLAUTH_PROVIDER_NO_LOGON_SERVERS || code == TSLAUTH_PROVIDER_NO_NETWORK ||

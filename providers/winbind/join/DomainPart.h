@@ -8,10 +8,10 @@ namespace tessel::winbind {
 class Host;
 
 /// Parts the host. A failure leaves it joined as it was, but for 0xFFFF0002: its account is deleted
-/// in the directory, and the host is not local yet, or keeps what the log names; a further part goes
-/// on with it.
-/// @param credentials null: the host's own account is tried; whether it could be deleted or not, the
-///        host is local afterwards
+/// in the directory, and the host is not local yet, or keeps what the log names; a further part
+/// goes on with it.
+/// @param credentials null: the host's own account is tried; whether it could be deleted or not,
+///        the host is local afterwards
 /// @throws Failure
 void PartFromDomain(Host const& host, ActiveDirectoryClientCredentials const* credentials);
 

@@ -15,9 +15,9 @@
 
 namespace tessel::winbind {
 
-/// What a controller has last answered to one question in this process, for as long as none answers:
-/// a host that was told its trusted domains has not lost them because its network is down. Any
-/// thread may ask.
+/// What a controller has last answered to one question in this process, for as long as none
+/// answers: a host that was told its trusted domains has not lost them because its network is down.
+/// Any thread may ask.
 template <typename Answer> class LastAnswer {
 public:
     /// What `ask` returns; where it fails because no controller answers, what it returned last.

@@ -230,9 +230,9 @@ std::string AccountOfCanonicalName(Host const& host, WinbindClient const& client
     return accounts.front();
 }
 
-/// The user of the principal name `text`. What it is of need not be a domain, nor what stands before
-/// it an account's name: a controller knows both by the user's own attribute. Only where it does not,
-/// they are taken as they look.
+/// The user of the principal name `text`. What it is of need not be a domain, nor what stands
+/// before it an account's name: a controller knows both by the user's own attribute. Only where it
+/// does not, they are taken as they look.
 std::string UserOfPrincipal(Host const& host, WinbindClient const& client, Domain const& own,
                             UserName const& user, std::string const& text,
                             Clock::time_point deadline) {
@@ -356,7 +356,8 @@ std::vector<Domain> GetTrustedDomains(Host const& host) {
     static LastAnswer<std::vector<Domain>>& last =
         *std::make_unique<LastAnswer<std::vector<Domain>>>().release(); // as long as any thread
     return last.Get(*own, [&] {
-        // A domain behind another one is nobody's trust in the directory, and known once it was met.
+        // A domain behind another one is nobody's trust in the directory, and known once it was
+        // met.
         std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);
         std::vector<Domain> domains = DomainsOf(AllTrusts(host, deadline));
         for (Domain const& domain : remembered) {
@@ -448,7 +449,8 @@ int GetDomainTrustRelationship(Host const& host, std::string const& domain) {
     if (!found) {
         return 0;
     }
-    // A domain behind another one, which the host reaches because all trusts between are transitive.
+    // A domain behind another one, which the host reaches because all trusts between are
+    // transitive.
     bool const isInForest = client.GetForest(own->DNSName()) == client.GetForest(found->DNSName());
     return TSLAUTH_WINBIND_TRUST_TRANSITIVE | TSLAUTH_WINBIND_TRUST_OUTBOUND |
            (isInForest ? TSLAUTH_WINBIND_TRUST_IN_FOREST | TSLAUTH_WINBIND_TRUST_INBOUND : 0);

@@ -31,12 +31,12 @@ int GetDomainTrustState(Host const& host);
 /// The state that a failed check of the host's secret means.
 int TrustStateOf(ActiveDirectoryClientErrorCode code);
 
-/// The domains whose users the host may know, its own domain not among them. None for a host that is
-/// not joined.
+/// The domains whose users the host may know, its own domain not among them. None for a host that
+/// is not joined.
 std::vector<authentication::Domain> GetTrustedDomains(Host const& host);
 
-/// The name of a controller of `domain`, which is a DNS or a NetBIOS name. A host that is not joined
-/// asks DNS, which knows no NetBIOS names, and takes the first of what it lists.
+/// The name of a controller of `domain`, which is a DNS or a NetBIOS name. A host that is not
+/// joined asks DNS, which knows no NetBIOS names, and takes the first of what it lists.
 /// @param site where the controller is to be; empty: anywhere. DNS alone is not asked for sites.
 std::string GetAnyDomainController(Host const& host, std::string const& site,
                                    std::string const& domain);

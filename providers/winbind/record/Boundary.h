@@ -39,8 +39,8 @@ template <typename Body> int ValueOf(char const* entry, int otherwise, Body&& bo
     }
 }
 
-/// Each hands out a copy, and the function that releases it. Where memory is short (std::bad_alloc),
-/// the slots stay as they are.
+/// Each hands out a copy, and the function that releases it. Where memory is short
+/// (std::bad_alloc), the slots stay as they are.
 /// @{
 void HandOut(std::string const& text, char** slot, ActiveDirectoryClientFreeFunction* release);
 /// Two pieces of memory, since the caller releases each name by itself. An empty name stays null.

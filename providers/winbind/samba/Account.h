@@ -13,9 +13,9 @@ namespace tessel::winbind {
 /// argument or in the environment.
 class Account {
 public:
-    /// @throws Failure 87 for a missing text, 1315 for a user name that the tools cannot read, 86 for
-    ///         an empty password and 1216 for one that they cannot read: with a line end, or longer
-    ///         than 127 bytes with a leading blank
+    /// @throws Failure 87 for a missing text, 1315 for a user name that the tools cannot read, 86
+    ///         for an empty password and 1216 for one that they cannot read: with a line end, or
+    ///         longer than 127 bytes with a leading blank
     explicit Account(ActiveDirectoryClientCredentials const& credentials);
 
     /// Lets a task act as this account, which must outlive it.

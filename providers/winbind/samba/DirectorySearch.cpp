@@ -44,8 +44,8 @@ std::vector<DirectoryEntry> SearchDirectory(Host const& host, std::string const&
                                             std::string const& filter,
                                             std::vector<std::string> const& attributes,
                                             Clock::time_point deadline) {
-    // What `net` remembers is its own: in the lock folder of the host, winbindd and every later `net`
-    // would go on for a minute without a controller that has not answered once.
+    // What `net` remembers is its own: in the lock folder of the host, winbindd and every later
+    // `net` would go on for a minute without a controller that has not answered once.
     StagingFolder const scratch(host.At(Paths::Staging));
     ChildProcess::Task task{
         {"net", "ads", "search", "--machine-pass", "--option=lock directory=" + scratch.Memory()}};

@@ -14,8 +14,8 @@ namespace tessel::winbind {
 
 class Host;
 
-/// One object: its attributes, several of a name in the order of the directory. The names are in the
-/// case of the question.
+/// One object: its attributes, several of a name in the order of the directory. The names are in
+/// the case of the question.
 typedef std::multimap<std::string, std::string> DirectoryEntry;
 
 /// The value of an attribute, the first of several; empty where there is none.

@@ -16,7 +16,8 @@ class SambaTools;
 namespace DomainDiscovery {
 
 /// The first writable controller of `domain` that answers: the preferred ones, then DNS's.
-/// @throws Failure as `Host::AskDNS` where DNS is needed, 1311 where none of them answers by `deadline`
+/// @throws Failure as `Host::AskDNS` where DNS is needed, 1311 where none of them answers by
+///         `deadline`
 ControllerAnswer FindController(Host const& host, SambaTools const& tools,
                                 std::string const& domain,
                                 std::vector<std::string> const& preferred,

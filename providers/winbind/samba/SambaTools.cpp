@@ -116,7 +116,8 @@ ChildProcess::Task SambaTools::Task() const {
     // Tickets are the child's alone, and go with it.
     task.environment = {"KRB5CCNAME=MEMORY:tslauth"};
     if (!_kerberosConfiguration.empty()) {
-        // Without a word in it of where a host belongs, Kerberos asks DNS, domain by domain upwards.
+        // Without a word in it of where a host belongs, Kerberos asks DNS, domain by domain
+        // upwards.
         task.environment.push_back("KRB5_CONFIG=" + _kerberosConfiguration);
     }
     return task;

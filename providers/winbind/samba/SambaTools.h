@@ -47,8 +47,8 @@ public:
     /// Takes the membership from the text of an offline join. Asks nobody.
     void JoinOffline(SecretFile const& blob, Clock::time_point deadline) const;
 
-    /// Adds the keys of the host's account to a keytab, which may not be there yet. They are those of
-    /// the secrets, which the account must have been made with.
+    /// Adds the keys of the host's account to a keytab, which may not be there yet. They are those
+    /// of the secrets, which the account must have been made with.
     void WriteKeytab(std::string const& controller, std::string const& path,
                      Clock::time_point deadline) const;
 

@@ -201,7 +201,7 @@ void WinbindDaemon::Reload() const noexcept {
 }
 
 void WinbindDaemon::CheckTrust(Clock::time_point deadline) const {
-    // A controller that has not heard of a new secret yet hears of it soon, or another one is asked.
+    // A controller that has not heard of a new secret yet does so soon, or another one is asked.
     auto const certain = std::min(deadline, Clock::now() + refusalPatience);
     // Soon at first: it takes winbindd a moment to find its controller.
     for (auto wait = pause;; wait = std::min(2 * wait, longPause)) {

@@ -15,7 +15,8 @@ std::string DomainName(std::string_view name);
 /// The host's NetBIOS name: the first label of `hostName`, in capitals.
 /// @throws Failure TSLAUTH_PROVIDER_INVALID_COMPUTER_NAME where that is no name that a machine
 ///         account can have: empty, longer than 15 characters, digits alone, or other characters
-///         than letters, digits and inner hyphens. It is never cut: two hosts would share an account.
+///         than letters, digits and inner hyphens. It is never cut: two hosts would share an
+///         account.
 std::string ComputerName(std::string_view hostName);
 
 /// "DC=corp,DC=example" for "corp.example".
@@ -32,8 +33,8 @@ struct OrganisationalUnit {
 /// without the domain's part. In a path, "\/" and "\\" stand for a slash and a backslash in a name;
 /// the one name "Computers" is the container that every domain has. A distinguished name is escaped
 /// as RFC 4514 says and may name units and containers.
-/// @throws Failure TSLAUTH_PROVIDER_INVALID_PARAMETER for a malformed unit or one of another domain,
-///         TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME
+/// @throws Failure TSLAUTH_PROVIDER_INVALID_PARAMETER for a malformed unit or one of another
+///         domain, TSLAUTH_PROVIDER_INVALID_DOMAIN_NAME
 OrganisationalUnit ReadOrganisationalUnit(std::string_view unit, std::string_view domain);
 
 /// A user's name, taken apart.

@@ -13,8 +13,8 @@ namespace tessel::winbind {
 bool HasKerberosInclude(std::string_view text, std::string_view path);
 
 /// `text` with `path` included before everything else: of several values, Kerberos takes the first.
-/// `text` itself where it is included already. WithoutKerberosInclude() gives back the very bytes of
-/// a `text` that did not include it.
+/// `text` itself where it is included already. WithoutKerberosInclude() gives back the very bytes
+/// of a `text` that did not include it.
 std::string WithKerberosInclude(std::string_view text, std::string_view path);
 
 /// `text` without the lines that WithKerberosInclude() added, wherever they have got to since, and

@@ -9,8 +9,8 @@
 #include <string_view>
 #include <vector>
 
-/// The provider's own file for Samba, which the administrator's includes. Text in, text out: no file
-/// is opened here.
+/// The provider's own file for Samba, which the administrator's includes. Text in, text out: no
+/// file is opened here.
 namespace tessel::winbind {
 
 /// What the provider's own file says about the domain.
@@ -24,8 +24,9 @@ struct SambaDomain {
 
 /// The provider's own file, for a host whose administrator sets `administrator`. What the provider
 /// depends on always stands in it; what is a matter of taste only where the administrator leaves it
-/// open; of the options those are so that are. The numbers of users and groups come from ranges that overlap with none of his. Comments may
-/// be put in front of the text and nothing behind it: its last line may have to be without a line end.
+/// open; of the options those are so that are. The numbers of users and groups come from ranges
+/// that overlap with none of his. Comments may be put in front of the text and nothing behind it:
+/// its last line may have to be without a line end.
 /// @throws Failure TSLAUTH_PROVIDER_INVALID_PARAMETER for a value with a control character
 std::string SambaDomainText(SambaDomain const& domain, SambaSettings const& administrator,
                             ProviderOptions const& options);

@@ -4,8 +4,8 @@
 #include <string>
 #include <string_view>
 
-/// The line by which the administrator's smb.conf(5) includes the provider's own file. Text in, text
-/// out: no file is opened here.
+/// The line by which the administrator's smb.conf(5) includes the provider's own file. Text in,
+/// text out: no file is opened here.
 namespace tessel::winbind {
 
 /// Whether one of the [global] sections of `text` includes the file `path`.

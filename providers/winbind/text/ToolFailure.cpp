@@ -21,8 +21,9 @@ struct KnownText {
 
 /// The first entry whose text occurs decides, so that what says most stands first: a tool often
 /// tries another way after a failure, and prints what came of both. Texts are compared without
-/// regard to case, and "*" stands for the rest of a line up to what follows. Samba prints what a controller said as a name (NT_STATUS_..., WERR_...) or as the
-/// sentence that belongs to it, and adds the texts of LDAP and Kerberos.
+/// regard to case, and "*" stands for the rest of a line up to what follows. Samba prints what a
+/// controller said as a name (NT_STATUS_..., WERR_...) or as the sentence that belongs to it, and
+/// adds the texts of LDAP and Kerberos.
 constexpr KnownText KnownTexts[] = {
     // The account that asks. What is wrong with it is said only to who knows its password.
     {"account_disabled", TSLAUTH_PROVIDER_ACCOUNT_DISABLED},

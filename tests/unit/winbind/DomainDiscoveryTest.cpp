@@ -10,8 +10,8 @@
 #include <string>
 #include <vector>
 
-/// As in a Turkish locale, where "I" and "i" are two letters: who compares names of a domain must not
-/// ask the locale of the host process.
+/// As in a Turkish locale, where "I" and "i" are two letters: who compares names of a domain must
+/// not ask the locale of the host process.
 extern "C" int strcasecmp(char const* left, char const* right) noexcept {
     auto const lower = [](char c) {
         return c >= 'A' && c <= 'Z' && c != 'I' ? static_cast<char>(c - 'A' + 'a') : c;

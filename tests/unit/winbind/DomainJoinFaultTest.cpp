@@ -42,8 +42,8 @@ void Part(PlayedHost const& host) {
     PartFromDomain(host, &joiner);
 }
 
-/// A join or a part of a host, with each of its system calls that touch a file failing once, or being
-/// the last.
+/// A join or a part of a host, with each of its system calls that touch a file failing once, or
+/// being the last.
 class DomainJoinFaultTest : public testing::Test {
 protected:
     typedef std::map<std::string, std::string> Tree;
@@ -106,7 +106,8 @@ TEST_F(DomainJoinFaultTest, WhateverWriteOfAJoinFailsTheHostIsAsItWasOrTheCodeSa
                 }
                 if (code != TSLAUTH_WINBIND_HOST_CHANGED) {
                     auto tree = _host->Tree();
-                    // What a failed removal leaves below /run holds nothing, and the next one removes it.
+                    // What a failed removal leaves below /run holds nothing, and the next one
+                    // removes it.
                     for (auto entry = tree.begin(); entry != tree.end();) {
                         entry = entry->first.find("/run/tslauth") == 0 ? tree.erase(entry)
                                                                        : std::next(entry);

@@ -320,7 +320,7 @@ TEST(DomainJoinTest, LookingAtAHostChangesNothing) {
     EXPECT_EQ(before, host.Tree());
 }
 
-// --- every call of a tool fails once --------------------------------------------------------------
+// --- every call of a tool fails once ---
 
 /// What a code promises of the host and of the directory.
 void ExpectPromiseKept(PlayedHost const& host, std::map<std::string, std::string> const& before,
@@ -421,7 +421,7 @@ TEST(DomainJoinTest, AnAccountThatWasThereBeforeIsNotDeleted) {
     EXPECT_EQ(before, host.Tree());
 }
 
-// --- what an operation without an end has left -----------------------------------------------------
+// --- what an operation without an end has left ---
 
 /// A host that is joined, with the mark of a change that did not end.
 void JoinInHalf(PlayedHost& host) {

@@ -24,9 +24,9 @@ extern "C" { // it does not say so itself
 #include <wbclient.h>
 }
 
-/// libwbclient takes the socket's folder from the environment in a program that exports the first of
-/// these, and a folder that is not root's in one that exports the second: the wrappers of Samba's own
-/// tests do.
+/// libwbclient takes the socket's folder from the environment in a program that exports the first
+/// of these, and a folder that is not root's in one that exports the second: the wrappers of
+/// Samba's own tests do.
 extern "C" __attribute__((visibility("default"))) bool nss_wrapper_enabled(); // NOLINT: its name
 extern "C" __attribute__((visibility("default"))) bool uid_wrapper_enabled(); // NOLINT: its name
 
@@ -76,8 +76,8 @@ public:
         };
     }
 
-    /// @param folder where the socket is; empty: in a folder of this object's, which the environment
-    ///     names to libwbclient
+    /// @param folder where the socket is; empty: in a folder of this object's, which the
+    ///     environment names to libwbclient
     explicit FakeWinbindd(Script script, std::string folder = "") : _script(std::move(script)) {
         if (folder.empty()) {
             folder = _folder.Path();

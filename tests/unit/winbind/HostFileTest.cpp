@@ -158,7 +158,8 @@ TEST(HostFileTest, NoMarkAndNoOriginalComesBackWithAPowerLoss) {
     changes.Replace(folder / "old", "new", 0600);
     auto const outcome = faults::Run(
         [&] { changes.Keep(); }, [](std::size_t, std::string const&) { return faults::Happens(); });
-    // The mark's end is durable before the original's, and both before the changes are said to be kept.
+    // The mark's end is durable before the original's, and both before the changes are said to be
+    // kept.
     EXPECT_THAT(outcome.calls, ElementsAre("unlink", "open", "fsync", "close", "unlink", "open",
                                            "fsync", "close"));
     changes.Keep();

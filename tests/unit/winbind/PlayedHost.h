@@ -24,9 +24,9 @@
 #include <utility>
 #include <vector>
 
-/// A host below a folder, with Samba's programs, winbindd, DNS and a domain that are played: it counts
-/// what is asked of them, and any of it can be made to fail. What a child process has done to it is
-/// known to its parent.
+/// A host below a folder, with Samba's programs, winbindd, DNS and a domain that are played: it
+/// counts what is asked of them, and any of it can be made to fail. What a child process has done
+/// to it is known to its parent.
 class PlayedHost : public tessel::winbind::Host {
 public:
     /// How a call outside fails.

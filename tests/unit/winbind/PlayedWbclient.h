@@ -13,8 +13,8 @@
 #include <utility>
 #include <vector>
 
-/// What winbindd answers to this program, whose libwbclient is this file: its functions stand before
-/// the library's. For one test file a program.
+/// What winbindd answers to this program, whose libwbclient is this file: its functions stand
+/// before the library's. For one test file a program.
 struct PlayedWinbindd {
     struct Domain {
         std::string netBIOSName;
