@@ -37,6 +37,7 @@ constexpr char footer[] = R"(Exit codes:
   9  credentials refused
   10 not joined
   11 joined to another domain (join)
+  12 the domain does not tell, or the trust in it is not in order (status)
   A signal such as ^C ends the tool as such; a shell shows 128 and its number, 130 for ^C.
 )";
 
@@ -49,6 +50,7 @@ struct Arguments {
     std::string store;
     bool acceptLoss = false;
     bool write = false;
+    bool deep = false;
     std::string provider;
     AccessArguments access;
     bool list = false;
@@ -77,8 +79,12 @@ public:
 
         Add("stores", "List the stores; the active one has a star", arguments,
             [](Console& console) { return RunStores(console); });
-        Add("status", "Say which store is recorded and whether the host agrees with it", arguments,
-            [](Console& console) { return RunStatus(console); });
+        AddAsking(_app, "status",
+                  "Say which store is recorded and whether the host does as it says", arguments,
+                  [&](Console& console) {
+                      return RunStatus({arguments.deep, arguments.limit}, console);
+                  })
+            ->add_flag("--deep", arguments.deep, "Also have a controller check the trust");
 
         auto* plan = Add("plan", "Show what 'activate' would write, and change nothing", arguments,
                          [&](Console& console) { return RunPlan(arguments.store, console); });

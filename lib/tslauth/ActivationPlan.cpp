@@ -94,6 +94,24 @@ void AddCommentNote(std::size_t before, std::size_t after, PlannedFile& file) {
     }
 }
 
+std::vector<PlannedFile>::iterator FindFile(std::vector<PlannedFile>& files,
+                                            std::string const& path) {
+    return std::find_if(files.begin(), files.end(),
+                        [&](PlannedFile const& file) { return file.path == path; });
+}
+
+/// Adds a file, or what becomes of it after all that was planned for it before.
+void AddFile(PlannedFile file, std::vector<PlannedFile>& files) {
+    auto const planned = FindFile(files, file.path);
+    if (planned == files.end()) {
+        files.push_back(std::move(file));
+        return;
+    }
+    planned->after = std::move(file.after);
+    std::move(file.losses.begin(), file.losses.end(), std::back_inserter(planned->losses));
+    std::move(file.notes.begin(), file.notes.end(), std::back_inserter(planned->notes));
+}
+
 typedef std::map<std::string, std::string> Assignments;
 
 Assignments ReadRecord(std::string const& text) {
@@ -394,6 +412,11 @@ bool ActivationPreview::Changes() const {
                        [](PlannedFile const& file) { return file.Changes(); });
 }
 
+void ActivationPlan::Append(ActivationPlan const& next) {
+    auto const steps = next._steps;
+    _steps.insert(_steps.end(), steps.begin(), steps.end());
+}
+
 ActivationPlan::ActivationPlan() = default;
 ActivationPlan::ActivationPlan(ActivationPlan const& other) = default;
 ActivationPlan& ActivationPlan::operator=(ActivationPlan const& other) = default;
@@ -429,12 +452,29 @@ ActivationPreview ActivationPlan::Preview() const {
 
 ActivationPreview ActivationPlan::Preview(FileReader const& read) const {
     ActivationPreview preview;
+    // A later step finds a file as an earlier one leaves it.
+    auto const readAfterwards = [&](std::string const& path) {
+        auto const planned = FindFile(preview.files, path);
+        return planned == preview.files.end() ? read(path) : planned->after;
+    };
     try {
         if (Find(Paths::AuthenticationConfiguration)) {
             ReadRecord(read(Paths::AuthenticationConfiguration));
         }
         for (auto const& step : _steps) {
-            step->Preview(read, preview.files);
+            std::vector<PlannedFile> files;
+            auto const add = [&] {
+                for (auto& file : files) {
+                    AddFile(std::move(file), preview.files);
+                }
+            };
+            try {
+                step->Preview(readAfterwards, files);
+            } catch (std::exception const&) {
+                add(); // what it would have written before
+                throw;
+            }
+            add();
         }
     } catch (std::exception const&) {
         preview.refusal = std::current_exception();

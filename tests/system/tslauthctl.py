@@ -26,7 +26,7 @@ FILES = (PAM, NSS, RECORD)
 AD = "Active Directory"
 
 (DONE, FAILURE, USAGE, NOT_ROOT, REFUSED, LOSS, DRIFT, CHANGES, UNREACHABLE, CREDENTIALS,
- NOT_JOINED) = range(11)
+ NOT_JOINED, JOINED_ELSEWHERE, UNTRUSTED) = range(13)
 
 PLAIN_PAM = """#%PAM-1.0
 auth required /lib/security/$ISA/pam_access.so

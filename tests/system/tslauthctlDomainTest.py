@@ -110,7 +110,7 @@ class Membership(Case):
         self.assertEqual({"dns": "example.test", "netbios": "EXAMPLE"}, info["domain"])
         self.assertEqual([info["domain"]], info["trusted_domains"])
         self.assertEqual("CN=node,CN=Computers,DC=example,DC=test", info["machine_account"])
-        self.assertEqual((True, 1, [], []), (info["joined"], info["trust_state"],
+        self.assertEqual((True, 0, [], []), (info["joined"], info["trust_state"],
                                              info["preferred_domain_controllers"],
                                              info["failures"]))
         self.assertEqual("node", ask("dc")["controller"])
@@ -129,7 +129,7 @@ class Membership(Case):
                          b"machine account: CN=node,CN=Computers,DC=example,DC=test\n"
                          b"preferred domain controllers: none\n"
                          b"trusted domains: example.test (EXAMPLE)\n"
-                         b"trust state: 1\n", run("info").stdout)
+                         b"trust state: in-order (0)\n", run("info").stdout)
         self.assertEqual(b"The host is parted from its domain.\n", run("part").stdout)
 
     def test_a_join_repairs_the_name_resolution(self):

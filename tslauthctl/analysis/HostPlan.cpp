@@ -3,6 +3,7 @@
 
 #include "analysis/Failures.h"
 #include "analysis/KnownStores.h"
+#include "analysis/ProviderCheck.h"
 #include "analysis/ProviderOnHost.h"
 
 #include <tslauth/ActiveDirectoryStore.h>
@@ -16,13 +17,58 @@ namespace {
 
 using namespace authentication;
 
-ActivationPlan PlanFor(HostPlan& plan) {
-    if (plan.store == NoStore) {
-        return NoRemoteAuthenticationStore().GetActivationPlan(EditForm::Lossless);
+/// Takes out what earlier activations left, whatever has become of their providers.
+ActivationPlan WithdrawalOf(EntriesList const& entries) {
+    ActivationPlan plan;
+    for (auto const& each : entries) {
+        auto const withdrawal = ActivationPlan::Withdrawing(each, EditForm::Lossless);
+        if (withdrawal.Preview().Changes()) {
+            plan.Append(withdrawal);
+        }
     }
+    return plan;
+}
+
+/// The entries of the configured provider, if it can be loaded.
+EntriesList EntriesOfConfigured() {
+    try {
+        return {ActiveDirectoryStore(0).GetProviderEntries()};
+    } catch (std::exception const&) {
+        return {};
+    }
+}
+
+ActivationPlan PlanForNone(HostPlan& plan) {
+    auto steps = NoRemoteAuthenticationStore().GetActivationPlan(EditForm::Lossless);
+    bool const withdrawsConfigured = RecordedStore() == ActiveDirectory;
+    auto const configured = EntriesOfConfigured();
+    auto left = plan.insertedMeanwhile = InsertedOnHost();
+    for (auto const& each : configured) {
+        left = Without(left, each);
+        if (!withdrawsConfigured) {
+            // "None" was recorded by somebody who failed, or did, no more.
+            left.push_back(each);
+        }
+    }
+    steps.Append(WithdrawalOf(left));
+    return steps;
+}
+
+ActivationPlan PlanForActiveDirectory(HostPlan& plan) {
     ActiveDirectoryStore const store(0);
-    plan.warnings = MissingModules(store.GetProviderEntries());
-    return store.GetActivationPlan(EditForm::Lossless);
+    auto const entries = store.GetProviderEntries();
+    plan.warnings = MissingModules(entries);
+    auto const left = Without(InsertedOnHost(), entries);
+    plan.insertedMeanwhile = left;
+    plan.insertedMeanwhile.push_back(entries);
+    plan.insertedAfterwards = {entries};
+    auto steps = WithdrawalOf(left);
+    steps.Append(store.GetActivationPlan(EditForm::Lossless));
+    return steps;
+}
+
+ActivationPlan PlanFor(HostPlan& plan) {
+    return plan.store == NoStore ? PlanForNone(plan) : PlanForActiveDirectory(plan);
 }
 
 } // namespace
@@ -30,6 +76,7 @@ ActivationPlan PlanFor(HostPlan& plan) {
 HostPlan MakeHostPlan(std::string const& store) {
     HostPlan plan;
     plan.store = store;
+    CheckProvider();
     try {
         plan.steps = PlanFor(plan);
         plan.recorded = RecordedStore();

@@ -2,6 +2,7 @@
 #ifndef TSLAUTHCTL_HOSTPLAN_H
 #define TSLAUTHCTL_HOSTPLAN_H
 
+#include "analysis/InsertedEntries.h"
 #include "terminal/Console.h"
 
 #include <tslauth/ActivationPlan.h>
@@ -20,6 +21,10 @@ struct HostPlan {
     /// What is executed: the form that changes only the lines concerned.
     authentication::ActivationPlan steps;
     authentication::ActivationPreview preview;
+    /// Whose entries stand in the files, or may do so after an interruption, before the plan is
+    /// executed and after it.
+    EntriesList insertedMeanwhile;
+    EntriesList insertedAfterwards;
     /// What keeps the store from working although nothing would be lost.
     std::vector<std::string> warnings;
     /// Why the library would refuse, or refuse half way: some of the files would be written before.

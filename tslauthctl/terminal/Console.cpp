@@ -93,6 +93,8 @@ char const* Word(ExitCode code) {
         return "not-joined";
     case ExitCode::joinedElsewhere:
         return "joined-elsewhere";
+    case ExitCode::untrusted:
+        return "untrusted";
     }
     return "failure";
 }

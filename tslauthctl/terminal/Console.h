@@ -23,7 +23,8 @@ enum class ExitCode {
     unreachable = 8,
     credentials = 9,
     notJoined = 10,
-    joinedElsewhere = 11
+    joinedElsewhere = 11,
+    untrusted = 12
 };
 
 /// The word for an exit code, as it stands in the JSON document.

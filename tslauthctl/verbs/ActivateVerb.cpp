@@ -72,8 +72,10 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         console.ErrorDetail("see 'tslauthctl prepare', or give --accept-loss");
         return ExitCode::loss;
     }
+    RecordInserted(plan.insertedMeanwhile);
     try {
         plan.steps.Execute();
+        RecordInserted(plan.insertedAfterwards);
     } catch (std::exception const& e) {
         console.Error(Refused(e));
         auto const changed = ChangedFiles(plan);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Failures.h"
 #include "analysis/JoinedDomain.h"
+#include "analysis/TrustWord.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/Exceptions.h>
@@ -63,8 +64,9 @@ std::string const& JSON(std::string const& text) {
     return text;
 }
 
-std::string Text(int number) {
-    return std::to_string(number);
+/// The state of the trust, the one number there is.
+std::string Text(int state) {
+    return std::string(TrustWord(state)) + " (" + std::to_string(state) + ")";
 }
 
 int JSON(int number) {
@@ -212,6 +214,11 @@ ExitCode RunInfo(Limit limit, Console& console) {
         auto const answer = AnswerTo(console, trust);
         return nothingToRead ? std::optional<int>(TrustStateFileNotFound) : ValueOf(answer);
     });
+
+    document["trust_state_word"] = nullptr;
+    if (document["trust_state"].is_number()) {
+        document["trust_state_word"] = TrustWord(document["trust_state"].get<int>());
+    }
 
     if (auto const& failure = report.FirstFailure()) {
         console.Error(*failure);

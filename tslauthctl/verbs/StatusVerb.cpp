@@ -1,8 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Agreement.h"
 #include "analysis/Failures.h"
+#include "analysis/Findings.h"
 #include "analysis/HostFile.h"
+#include "analysis/JoinedDomain.h"
 #include "analysis/KnownStores.h"
+#include "analysis/ProviderCheck.h"
 #include "analysis/ProviderOnHost.h"
 #include "verbs/Verbs.h"
 
@@ -12,13 +15,19 @@
 
 #include <tslauth/Paths.h>
 
+#include <filesystem>
+#include <map>
 #include <optional>
+#include <system_error>
+#include <unistd.h>
 
 namespace tessel::tslauthctl {
 
 namespace {
 
 using namespace authentication;
+
+constexpr char PolicyFolder[] = "/etc/pam.d";
 
 /// For people, where the JSON word is terse.
 std::string Text(Agreement agreement) {
@@ -66,9 +75,73 @@ Agreement DescribeFile(char const* path, bool providerKnown, Parts const& parts,
     return agreement;
 }
 
+/// Every policy that a service may have, by its path.
+std::map<std::string, std::optional<std::string>> Policies() {
+    std::map<std::string, std::optional<std::string>> policies;
+    std::error_code error;
+    for (auto const& entry : std::filesystem::directory_iterator(PolicyFolder, error)) {
+        auto const path = entry.path().string();
+        policies[path] = HostFileOrNothing(path);
+    }
+    return policies;
+}
+
+/// Asks the provider what it takes a while to tell.
+void AskProvider(StatusArguments const& arguments, HostFacts& facts, Console& console) {
+    try {
+        auto const provider = OpenProvider();
+        auto const domain = Explaining(Account::none, [&] {
+            return Ask(console, "the provider to name the host's domain", arguments.limit,
+                       [provider] { return provider->GetActiveDomain(); });
+        });
+        facts.joined = !domain.DNSName().empty() || !domain.NetBIOSName().empty();
+        if (arguments.deep && *facts.joined) {
+            facts.trustState = Explaining(Account::none, [&] {
+                return Ask(console, "the provider's answer about the state of the trust",
+                           arguments.limit, [provider] { return provider->GetDomainTrustState(); });
+            });
+        }
+    } catch (Failure const& e) {
+        if (e.ExceptionClass() != ClassName(CallNotImplementedException())) {
+            facts.notTold = std::string("the provider does not tell about the domain: ") + e.what();
+        }
+    }
+}
+
+void Describe(std::vector<Finding> const& findings, Console& console) {
+    auto& list = console.Document()["findings"] = nlohmann::json::array();
+    for (auto const& finding : findings) {
+        list.push_back(
+            {{"word", finding.word}, {"text", finding.text}, {"advice", finding.advice}});
+        if (finding.word == "not-looked-at") {
+            console.Note(finding.text);
+            continue;
+        }
+        console.Warning(finding.word + ": " + finding.text);
+        if (!finding.advice.empty()) {
+            console.Line("  see: " + finding.advice);
+        }
+    }
+}
+
+/// How the command ends by what was found beside the two files.
+ExitCode ExitCodeOf(std::vector<Finding> const& findings) {
+    auto code = ExitCode::done;
+    for (auto const& finding : findings) {
+        if (finding.word == "not-joined") {
+            code = code == ExitCode::done ? ExitCode::notJoined : code;
+        } else if (finding.word == "trust" || finding.word == "not-told") {
+            code = code == ExitCode::done ? ExitCode::untrusted : code;
+        } else if (finding.word != "not-looked-at") {
+            return ExitCode::drift;
+        }
+    }
+    return code;
+}
+
 } // namespace
 
-ExitCode RunStatus(Console& console) {
+ExitCode RunStatus(StatusArguments const& arguments, Console& console) {
     auto const recorded = RecordedStore();
     bool const isKnown = IsKnownStore(recorded);
     bool const wanted = recorded == ActiveDirectory;
@@ -90,6 +163,7 @@ ExitCode RunStatus(Console& console) {
     std::vector<std::string> warnings;
     std::string const shown = name.empty() ? "none" : name;
     try {
+        CheckProvider();
         entries = ActiveDirectoryStore(0).GetProviderEntries();
         provider["loaded"] = true;
         provider["pam_module"] = entries->pam.module();
@@ -115,9 +189,22 @@ ExitCode RunStatus(Console& console) {
         [&](std::string const& text) { return NSSParts(text, entries->nss, wanted); },
         UnknownNSSParts(), console);
 
-    if (wanted) {
-        console.Warnings(warnings);
+    HostFacts facts;
+    facts.wanted = wanted;
+    facts.root = geteuid() == 0;
+    facts.configured = entries;
+    facts.inserted = InsertedOnHost();
+    facts.policies = Policies();
+    facts.nameServices = HostFileOrNothing(Paths::NSSConfiguration);
+    facts.missingModules = warnings;
+    if (wanted && entries) {
+        AskProvider(arguments, facts, console);
     }
+    if (wanted && !warnings.empty()) {
+        console.Document()["warnings"] = warnings;
+    }
+    auto const findings = FindingsOf(facts);
+    Describe(findings, console);
     auto const drifts = [](Agreement agreement) {
         return agreement == Agreement::partly || agreement == Agreement::notAtAll;
     };
@@ -126,11 +213,12 @@ ExitCode RunStatus(Console& console) {
     }
     // A host that wants no provider is well without one. Where one is named, its entries may have
     // been left in the files, and that nobody can tell is no good news.
-    if (!entries) {
+    auto const found = ExitCodeOf(findings);
+    if (!entries && found == ExitCode::done) {
         return wanted || !name.empty() ? ExitCode::refused : ExitCode::done;
     }
     bool const unread = pam == Agreement::unknown || nss == Agreement::unknown;
-    return unread ? ExitCode::failure : ExitCode::done;
+    return unread && entries ? ExitCode::failure : found;
 }
 
 } // namespace tessel::tslauthctl

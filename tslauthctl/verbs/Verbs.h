@@ -18,7 +18,13 @@ namespace tessel::tslauthctl {
 struct HostPlan;
 
 ExitCode RunStores(Console& console);
-ExitCode RunStatus(Console& console);
+struct StatusArguments {
+    /// Also whether the trust checks out, which a controller is asked for.
+    bool deep = false;
+    Limit limit;
+};
+
+ExitCode RunStatus(StatusArguments const& arguments, Console& console);
 ExitCode RunPlan(std::string const& store, Console& console);
 ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console);
 ExitCode RunPlanSetup(std::string const& provider, Console& console);

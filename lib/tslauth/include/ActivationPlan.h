@@ -118,6 +118,9 @@ public:
     ActivationPlan& operator=(ActivationPlan const& other);
     ~ActivationPlan();
 
+    /// Does what `next` does behind what this does.
+    void Append(ActivationPlan const& next);
+
     /// What `Execute` would do to this host. Blocks for the disk; writes nothing. Where a store is
     /// made inactive, its provider is loaded. Of a store that is not one of the library's own it is
     /// not known what it writes, and none of its files is shown.
