@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "analysis/ChangeLog.h"
 #include "analysis/Failures.h"
 #include "analysis/NearestName.h"
-#include "verbs/ChangeLog.h"
 #include "verbs/Verbs.h"
 
 #if defined(__GNUC__)

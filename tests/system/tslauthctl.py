@@ -69,6 +69,16 @@ def set_up(pam=PLAIN_PAM, nss=PLAIN_NSS, store="None", provider="example"):
         os.chmod(path, 0o644)
 
 
+def follow():
+    """Lets the services of the host follow the policy, and joins it to the example's domain."""
+    for path in pathlib.Path("/etc/pam.d").glob("common-*"):
+        path.write_text("".join(f"{facility} include system-auth-generic\n"
+                                for facility in ("auth", "account", "password", "session")))
+    state = pathlib.Path("/var/lib/tslauth-example")
+    state.mkdir(exist_ok=True)
+    (state / "joined").write_text("CN=node,CN=Computers,DC=example,DC=test\n")
+
+
 SCRIPTS = pathlib.Path("/run/directed")
 
 

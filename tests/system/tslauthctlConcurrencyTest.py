@@ -45,6 +45,7 @@ class Concurrency(unittest.TestCase):
             message = process.communicate()[1].replace(WAITING, b"")
             self.assertEqual((DONE, b""), (process.returncode, message))
         self.assertGreater(looks, 0)
+        follow()
         self.assertEqual(DONE, ask("status")["exit"])
 
     def test_without_the_lock_they_wait_and_say_so(self):

@@ -120,6 +120,51 @@ class Membership(Case):
         self.assertTrue(ask("part")["parted"])
         self.assertEqual(NOT_JOINED, ask("info")["exit"])
 
+    def test_a_host_that_is_joined_already_is_left_alone(self):
+        self.assertFalse(self.join()["already_joined"])
+        again = self.join(password="wrong")
+        self.assertEqual((DONE, True, True),
+                         (again["exit"], again["joined"], again["already_joined"]))
+        document = ask("join", "other.test", "--user", "joiner", "--password-stdin", input=b"secret")
+        self.assertEqual(JOINED_ELSEWHERE, document["exit"])
+        self.assertEqual("The host is joined to example.test, and not to other.test; 'tslauthctl part' "
+                         "takes it out", document["error"]["message"])
+
+    def test_a_failure_tells_its_cause_in_the_providers_words(self):
+        script(join="code 87", last_failure="there is no unit 'Attic'")
+        document = self.join()
+        self.assertEqual(LIBRARY + "InvalidParameterException", document["error"]["exception"])
+        self.assertIn("(there is no unit 'Attic')", document["error"]["message"])
+
+    def test_a_dry_run_changes_nothing(self):
+        before = HOSTS.read_bytes(), RESOLV.read_bytes()
+        document = ask("join", "example.test/Servers", "--dry-run")
+        self.assertEqual((CHANGES, False, "example.test", "Servers"),
+                         (document["exit"], document["joined"], document["domain"],
+                          document["organisational_unit"]))
+        self.assertEqual(before, (HOSTS.read_bytes(), RESOLV.read_bytes()))
+        self.assertEqual(NOT_JOINED, ask("info")["exit"])
+
+    def management_address(self):
+        self.addCleanup(subprocess.run, ["ip", "link", "delete", "management"])
+        command("sh", "-c", "ip link add management type dummy 2>/dev/null || "
+                            "ip link add management type veth")
+        command("ip", "address", "add", "192.0.2.10/24", "dev", "management")
+        command("ip", "link", "set", "management", "up")
+        command("ip", "route", "add", "default", "via", "192.0.2.254")
+
+    def test_a_failed_join_puts_the_name_resolution_back(self):
+        self.management_address()
+        HOSTS.write_text("127.0.0.1 localhost\n127.0.1.1 node.old.test node\n"
+                         "192.0.2.7 example.test\n192.0.2.10 files.test node\n")
+        before = HOSTS.read_bytes(), RESOLV.read_bytes()
+        document = ask("join", "example.test", "--user", "joiner", "--password-stdin",
+                       input=b"wrong")
+        self.assertEqual(CREDENTIALS, document["exit"], document)
+        self.assertEqual(["files.test"], document["dropped_names"])
+        self.assertIn(str(HOSTS), document["put_back"])
+        self.assertEqual(before, (HOSTS.read_bytes(), RESOLV.read_bytes()))
+
     def test_the_text_for_people(self):
         self.assertEqual(b"The host is joined to example.test.\n",
                          run("join", "example.test", "--user", "joiner", "--password-stdin",
@@ -133,12 +178,7 @@ class Membership(Case):
         self.assertEqual(b"The host is parted from its domain.\n", run("part").stdout)
 
     def test_a_join_repairs_the_name_resolution(self):
-        self.addCleanup(subprocess.run, ["ip", "link", "delete", "management"])
-        command("sh", "-c", "ip link add management type dummy 2>/dev/null || "
-                            "ip link add management type veth")
-        command("ip", "address", "add", "192.0.2.10/24", "dev", "management")
-        command("ip", "link", "set", "management", "up")
-        command("ip", "route", "add", "default", "via", "192.0.2.254")
+        self.management_address()
         # The names differ, so that the domain becomes a search domain, since it resolves.
         HOSTS.write_text("127.0.0.1 localhost\n127.0.1.1 node.old.test node\n"
                          "192.0.2.7 example.test\n")
@@ -229,7 +269,7 @@ class Failures(Case):
                 (1786, NOT_JOINED), (1787, NOT_JOINED), (2691, REFUSED), (1398, REFUSED),
                 (4711, REFUSED))
         for code, expected in rows:
-            script(join=f"code {code}", domain="a domain")
+            script(join=f"code {code}")
             self.assertEqual(expected, self.join()["exit"], code)
         script(part="code 5", domain="a domain")
         # Nobody's credentials were refused.
@@ -408,7 +448,7 @@ class CAM(Case):
         self.fails(REFUSED, "FileNotFoundException", "cam", "import", SERVER, "/none")
         self.fails(REFUSED, "InvalidCertificateException", "cam", "import", SERVER, "/etc/hosts")
         PINNED.unlink()
-        self.fails(REFUSED, "InvalidThumbprintStoreException", "cam", "import", SERVER,
+        self.fails(REFUSED, "IOError", "cam", "import", SERVER,
                    str(self.pem))
         self.fails(REFUSED, "IOError", "cam", "list")
         OPTIONS.unlink()

@@ -137,10 +137,6 @@ std::vector<Finding> FindingsOf(HostFacts const& facts) {
         }
     }
     AddMembership(facts, findings);
-    if (facts.setupBegun && !facts.setupFinished) {
-        findings.push_back({"setup-unfinished", "setting the host up was begun and not finished",
-                            "tslauthctl setup"});
-    }
     if (!facts.root) {
         findings.push_back(
             {"not-looked-at", "not looked at, since that needs root: what only root may read", ""});

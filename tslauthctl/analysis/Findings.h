@@ -38,9 +38,6 @@ struct HostFacts {
     std::optional<int> trustState;
     /// Why the provider did not say it.
     std::string notTold;
-    /// Whether setting up was begun, and whether it was finished.
-    bool setupBegun = false;
-    bool setupFinished = false;
 };
 
 std::vector<Finding> FindingsOf(HostFacts const& facts);

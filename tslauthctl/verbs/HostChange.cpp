@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "verbs/HostChange.h"
 
+#include "analysis/ChangeLog.h"
 #include "terminal/Console.h"
-#include "verbs/ChangeLog.h"
 
 #include <tslauth/Exceptions.h>
 

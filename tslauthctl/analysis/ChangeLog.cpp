@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "verbs/ChangeLog.h"
+#include "analysis/ChangeLog.h"
 
 #include "analysis/HostFile.h"
 #include "terminal/EscapedText.h"
