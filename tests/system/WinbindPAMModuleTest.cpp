@@ -244,6 +244,12 @@ TEST_F(WinbindPAMModuleTest, SomebodyElsesUserIsPassedOver) {
     EXPECT_EQ(PAM_SUCCESS, CheckOf("extra"));
 }
 
+TEST_F(WinbindPAMModuleTest, WhereUsersMayLogInOffLineTheyAreLetIn) {
+    Play("echo off-line");
+    EXPECT_EQ(PAM_SUCCESS, CheckOf("CORP\\user1"));
+    EXPECT_THAT(said, IsEmpty());
+}
+
 TEST_F(WinbindPAMModuleTest, ADomainThatDoesNotAnswerLetsNobodyIn) {
     for (char const* const script :
          {"echo no-answer", "", "exit 1", "echo in-orderly", "printf in-order", "kill -SEGV $$"}) {

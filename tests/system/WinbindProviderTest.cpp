@@ -103,7 +103,7 @@ TEST_F(WinbindProviderTest, EveryEntryButTheUnusedOneIsThere) {
 TEST_F(WinbindProviderTest, ItNamesItsModules) {
     ActiveDirectoryProvider const provider("winbind");
     EXPECT_EQ("pam_tslauth_winbind.so", provider.PAMModule());
-    EXPECT_THAT(provider.PAMModuleParameters(), ElementsAre("try_first_pass"));
+    EXPECT_THAT(provider.PAMModuleParameters(), ElementsAre("try_first_pass", "cached_login"));
     EXPECT_EQ("tslauth_winbind", provider.NSSModule());
     EXPECT_THAT(provider.NSSModuleParameters(), IsEmpty());
     EXPECT_EQ(2, provider.GetAPIVersion());

@@ -240,8 +240,9 @@ std::set<Made> MissingOf(Host const& host, Daemon const& daemon) {
 void WriteConfiguration(Host const& host, Domain const& domain, std::set<Made> const& made,
                         HostChanges& changes) {
     (void)changes.MakeFolder(host.At(Paths::OwnKerberosFolder), 0755);
-    changes.Replace(host.At(Paths::OwnKerberos),
-                    KerberosDomainText({domain.samba.realm, domain.dnsName}), 0644);
+    changes.Replace(
+        host.At(Paths::OwnKerberos),
+        KerberosDomainText({domain.samba.realm, domain.dnsName, {}, domain.samba.workgroup}), 0644);
     std::string const kerberos = host.At(Paths::Kerberos);
     changes.Replace(kerberos,
                     WithKerberosInclude(ReadHostFile(kerberos).value_or(""), Paths::OwnKerberos),

@@ -153,6 +153,7 @@ int CheckAccount(Call const& call, std::string const& user) {
     case AccountAnswer::NotOfTheDomain:
         return PAM_IGNORE;
     case AccountAnswer::InOrder:
+    case AccountAnswer::OffLine:
         return PAM_SUCCESS;
     case AccountAnswer::Disabled:
         return Refuse(call, PAM_ACCT_EXPIRED,

@@ -2,11 +2,14 @@
 #include "questions/AccountCheck.h"
 
 #include "Failure.h"
+#include "Paths.h"
 #include "host/Host.h"
+#include "host/HostFile.h"
 #include "host/Membership.h"
 #include "host/SystemLog.h"
 #include "questions/Questions.h"
 #include "samba/WinbindClient.h"
+#include "text/SambaSettings.h"
 
 #include <base/AsciiText.h>
 #include <cstdint>
@@ -76,6 +79,20 @@ std::optional<WinbindClient::Account> FindAccount(WinbindClient const& client,
     }
 }
 
+/// Whether a failure means that no controller was reached; then it is for the administrator to say
+/// what follows. Any other is no answer, whatever he says.
+bool IsSilence(ActiveDirectoryClientErrorCode code) {
+    return code == TSLAUTH_PROVIDER_TIMED_OUT || code == TSLAUTH_PROVIDER_NO_LOGON_SERVERS ||
+           code == TSLAUTH_PROVIDER_NO_NETWORK || code == TSLAUTH_PROVIDER_CONNECTION_INVALID ||
+           code == TSLAUTH_PROVIDER_CONNECTION_REFUSED;
+}
+
+/// As the join has set winbindd up, which lets users in on the same condition.
+bool LetsInOffLine(Host const& host) {
+    SambaSettings const settings(ReadHostFile(host.At(Paths::OwnSamba)).value_or(""));
+    return settings.Value("winbind offline logon") == "yes";
+}
+
 AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point deadline) {
     auto const membership = Membership::Read(host);
     if (!membership) {
@@ -117,6 +134,10 @@ AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
                               Clock::time_point deadline) {
     try {
         return Ask(host, user, deadline);
+    } catch (Failure const& failure) {
+        LogWarning("may '" + user + "' log in: " + failure.what());
+        return IsSilence(failure.Code()) && LetsInOffLine(host) ? AccountAnswer::OffLine
+                                                                : AccountAnswer::NoAnswer;
     } catch (std::exception const& failure) {
         LogWarning("may '" + user + "' log in: " + failure.what());
         return AccountAnswer::NoAnswer;

@@ -22,7 +22,7 @@ AccountAnswer StateOfAccount(DirectoryEntry const& entry,
 
 /// Asks winbindd who `user` is, a name in any form that the name service takes, and a controller of
 /// his domain for his account. Needs root. Every failure is `NoAnswer`, with its cause in the
-/// system log.
+/// system log; where no controller is reached it is `OffLine` on a host that lets users in then.
 /// @param deadline for each of them; a controller of another domain may have to be found before, in
 ///     the time of a question
 AccountAnswer AskAboutAccount(Host const& host, std::string const& user,

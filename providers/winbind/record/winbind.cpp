@@ -134,7 +134,7 @@ ActiveDirectoryClientMetadataRecord const ActiveDirectoryClientMetadata = {
     TSLAUTH_PROVIDER_API_VERSION,
     "pam_tslauth_winbind.so",
     // README.md says why each of them.
-    "try_first_pass",
+    "try_first_pass cached_login",
     "tslauth_winbind",
     nullptr,
 };

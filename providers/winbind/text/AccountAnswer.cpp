@@ -7,7 +7,8 @@ namespace {
 
 constexpr AccountAnswer all[] = {AccountAnswer::NotOfTheDomain, AccountAnswer::InOrder,
                                  AccountAnswer::Disabled,       AccountAnswer::LockedOut,
-                                 AccountAnswer::Expired,        AccountAnswer::NoAnswer};
+                                 AccountAnswer::Expired,        AccountAnswer::OffLine,
+                                 AccountAnswer::NoAnswer};
 
 } // namespace
 
@@ -23,6 +24,8 @@ std::string_view WordOf(AccountAnswer answer) {
         return "locked-out";
     case AccountAnswer::Expired:
         return "expired";
+    case AccountAnswer::OffLine:
+        return "off-line";
     case AccountAnswer::NoAnswer:
         break;
     }

@@ -13,6 +13,7 @@ enum class AccountAnswer {
     Disabled,
     LockedOut,
     Expired,
+    OffLine,  ///< no controller answers, and users may log in all the same
     NoAnswer, ///< nobody who knows has said anything
 };
 

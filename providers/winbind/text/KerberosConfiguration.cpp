@@ -37,6 +37,17 @@ void CheckWord(std::string const& word) {
     }
 }
 
+/// Whose ticket is whose. Without a rule Kerberos takes user@REALM for the host's user of that
+/// name: root of the domain for root of the host. With it, for DOMAIN\user, and for nobody else.
+std::string UserNameRule(KerberosDomain const& domain) {
+    std::string realm;
+    for (char const c : domain.realm) {
+        realm += c == '.' ? "\\." : std::string(1, c);
+    }
+    return "\t\tauth_to_local = RULE:[1:" + domain.workgroup + "\\$1@$0](.*@" + realm + ")s/@" +
+           realm + "$//\n";
+}
+
 } // namespace
 
 bool HasKerberosInclude(std::string_view text, std::string_view path) {
@@ -97,6 +108,10 @@ std::string KerberosDomainText(KerberosDomain const& domain) {
     for (auto const& controller : domain.controllers) {
         CheckWord(controller);
         text += "\t\tkdc = " + controller + '\n';
+    }
+    if (!domain.workgroup.empty()) {
+        CheckWord(domain.workgroup);
+        text += UserNameRule(domain);
     }
     return text + "\t}\n\n[domain_realm]\n\t" + domain.dnsName + " = " + domain.realm + "\n\t." +
            domain.dnsName + " = " + domain.realm + '\n';

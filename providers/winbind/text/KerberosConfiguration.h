@@ -28,6 +28,9 @@ struct KerberosDomain {
     /// The only controllers that Kerberos is to ask; empty where it is to find them in DNS, as it
     /// should on a host that stays joined.
     std::vector<std::string> controllers = {};
+    /// The domain's NetBIOS name, with which the host's names of its users begin; empty where no
+    /// user is to be known by a ticket.
+    std::string workgroup = {};
 };
 
 /// The provider's own file.

@@ -10,7 +10,8 @@ using namespace tessel::winbind;
 TEST(AccountAnswerTest, EveryAnswerIsReadFromItsLine) {
     for (AccountAnswer const answer :
          {AccountAnswer::NotOfTheDomain, AccountAnswer::InOrder, AccountAnswer::Disabled,
-          AccountAnswer::LockedOut, AccountAnswer::Expired, AccountAnswer::NoAnswer}) {
+          AccountAnswer::LockedOut, AccountAnswer::Expired, AccountAnswer::OffLine,
+          AccountAnswer::NoAnswer}) {
         EXPECT_EQ(answer, AnswerIn(std::string(WordOf(answer)) + "\n"));
     }
 }

@@ -59,6 +59,15 @@ TEST(KerberosConfigurationTest, ARealmIsFoundAtItsControllers) {
               GoldenText("krb5-tslauth.conf/controllers.conf"));
 }
 
+TEST(KerberosConfigurationTest, ATicketIsForTheDomainsUserAndForNoLocalOne) {
+    std::string const text = KerberosDomainText({"CORP.EXAMPLE", "corp.example", {}, "CORP"});
+    EXPECT_NE(std::string::npos,
+              text.find("\t\tauth_to_local = RULE:[1:CORP\\$1@$0](.*@CORP\\.EXAMPLE)"
+                        "s/@CORP\\.EXAMPLE$//\n\t}\n"))
+        << text;
+    EXPECT_EQ(std::string::npos, text.find("DEFAULT"));
+}
+
 TEST(KerberosConfigurationTest, NamesThatTheFileCannotHoldAreRefused) {
     for (std::string const& name : Texts{"", "A B", "A\n", "A}", "A={", "A#", "[A]", "A\"", "A;"}) {
         for (auto const& domain :
