@@ -5,6 +5,7 @@
 #include "terminal/EscapedText.h"
 #include "terminal/SignalWatch.h"
 
+#include <base/Descriptor.h>
 #include <base/FileError.h>
 
 #include <array>
@@ -23,27 +24,10 @@ namespace tessel::tslauthctl {
 
 namespace {
 
+using base::Descriptor;
 using base::SystemText;
 
 constexpr char terminalPath[] = "/dev/tty";
-
-class Descriptor {
-public:
-    explicit Descriptor(int number) : _number(number) {}
-    Descriptor(Descriptor const&) = delete;
-    Descriptor& operator=(Descriptor const&) = delete;
-    ~Descriptor() {
-        if (_number >= 0) {
-            close(_number);
-        }
-    }
-    int Number() const noexcept {
-        return _number;
-    }
-
-private:
-    int _number;
-};
 
 /// What has been read so far, up to its first line feed.
 class FirstLine {
@@ -119,12 +103,12 @@ void ReadFromFile(std::string const& path, Secret& secret) {
     // Neither a link, which leads to what somebody else chose, nor a pipe that never comes.
     Descriptor const file(
         open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
-    if (file.Number() < 0) {
+    if (file.Get() < 0) {
         int const error = errno;
         refuse(error == ELOOP ? "it is a link" : SystemText(error));
     }
     struct stat status = {};
-    if (fstat(file.Number(), &status) != 0) {
+    if (fstat(file.Get(), &status) != 0) {
         refuse(SystemText(errno));
     }
     if (!S_ISREG(status.st_mode)) {
@@ -136,7 +120,7 @@ void ReadFromFile(std::string const& path, Secret& secret) {
     if ((status.st_mode & (S_IRWXG | S_IRWXO)) != 0) {
         refuse("others may use it; make it readable for its owner alone (chmod 600)");
     }
-    ReadFrom(file.Number(), "'" + path + "'", secret);
+    ReadFrom(file.Get(), "'" + path + "'", secret);
 }
 
 void ReadFromDescriptor(int descriptor, std::string const& name, Secret& secret) {
@@ -244,23 +228,23 @@ int AskOnce(int terminal, std::string const& prompt, Secret& secret) {
 
 void ReadFromTerminal(std::string const& prompt, Secret& secret) {
     Descriptor const terminal(open(terminalPath, O_RDWR | O_NOCTTY | O_CLOEXEC));
-    if (terminal.Number() < 0) {
+    if (terminal.Get() < 0) {
         throw Failure(ExitCode::usage,
                       "There is no terminal to ask for the password; use --password-stdin, "
                       "--password-file or --password-fd");
     }
     for (;;) {
         // In the background the terminal is somebody else's, and its echo is not ours to turn off.
-        if (tcgetpgrp(terminal.Number()) != getpgrp()) {
+        if (tcgetpgrp(terminal.Get()) != getpgrp()) {
             // Stops here; afterwards it is looked at again. Where nobody can continue the process
             // the signal does nothing.
             (void)raise(SIGTTIN);
-            if (tcgetpgrp(terminal.Number()) != getpgrp()) {
+            if (tcgetpgrp(terminal.Get()) != getpgrp()) {
                 throw Failure(ExitCode::usage, "The password cannot be asked for in the "
                                                "background");
             }
         }
-        int const signal = AskOnce(terminal.Number(), prompt, secret);
+        int const signal = AskOnce(terminal.Get(), prompt, secret);
         if (signal == 0) {
             return;
         }
