@@ -30,7 +30,7 @@ constexpr char footer[] = R"(Exit codes:
   2  wrong usage, or a store that is not known
   3  must be run as root
   4  refused by the library; its message is shown
-  5  would lose something; nothing was changed
+  5  would lose something, which was left as it was
   6  the host is not in step with the recorded store (status)
   7  there is something to change (plan, prepare)
   8  timed out or unreachable

@@ -64,7 +64,8 @@ def install():
     modules = pathlib.Path(subprocess.run(
         ["find", "/usr/lib", "-path", "*/security/pam_permit.so", "-print", "-quit"], text=True,
         check=True, stdout=subprocess.PIPE).stdout.strip()).parent
-    shutil.rmtree(modules / "lib")
+    for folder in ("lib", "usr"):
+        shutil.rmtree(modules / folder, ignore_errors=True)
     for name in ("pam_tslauth_winbind.so", "pam_winbind.so"):
         shutil.copy(BUILD / "providers/modules" / name, modules)
     pathlib.Path("/usr/share/tslauth/setup").mkdir(parents=True)
@@ -88,7 +89,8 @@ def populate():
     extra = pathlib.Path("/var/lib/extrausers")
     extra.mkdir(exist_ok=True)
     (extra / "passwd").write_text(
-        f"{USER}:*:7001:7001::/home/CORP/ann:/bin/bash\nCORP\\other:*:7002:7001::/home/other:/bin/sh\n")
+        f"{USER}:*:7001:7001::/home/CORP/ann:/bin/bash\n"
+        "CORP\\other:*:7002:7001::/home/other:/bin/sh\n")
     (extra / "group").write_text(f"{GROUP}:x:7001:\n")
 
 
@@ -142,9 +144,9 @@ class SetupTest(unittest.TestCase):
         plan = ask("plan", "setup", "--provider", "winbind")
         self.assertEqual(plan["exit"], CHANGES)
         self.assertEqual(etc(), self.before)
-        self.assertEqual(plan["link"]["path"], str(LINK))
+        self.assertIn(str(LINK), [link["path"] for link in plan["links"]])
         done = self.set_up()
-        for field in ("files", "link", "profiles_on", "profiles_off"):
+        for field in ("files", "links", "profiles_on", "profiles_off"):
             self.assertEqual(done[field], plan[field])
         self.assertEqual(done["profiles_on"], ["tslauth", "tslauth-password"])
         self.assertEqual(done["profiles_off"], ["winbind"])
@@ -244,6 +246,14 @@ class SetupTest(unittest.TestCase):
         self.assertTrue(log_in(USER, "open_session"))
         self.assertEqual(home.stat().st_mode & 0o7777, 0o700)
         self.assertEqual(home.stat().st_uid, 7001)
+
+    def test_passwords_are_changed_where_they_are_kept(self):
+        self.set_up_and_activate()
+        self.assertTrue(log_in("lena", "chauthtok", password="another secret\nanother secret"))
+        self.assertTrue(log_in("lena", "authenticate", password="another secret"))
+        self.assertFalse(log_in("lena", "authenticate", password="local secret"))
+        self.assertTrue(log_in("lena", "chauthtok", password="local secret\nlocal secret"))
+        self.assertTrue(log_in(USER, "chauthtok"), "Samba's module takes every change")
 
     def test_activate_and_back_loses_nothing(self):
         self.set_up()

@@ -34,6 +34,18 @@ rpc:            db files
 netgroup:       nis
 """
 
+# Of two lines for a database the C library uses the last, and the library's reader both.
+TWICE_NSS = PLAIN_NSS + "passwd: files\n"
+
+# An entry behind the access rules would move where the jump lands.
+JUMPING_PAM = """auth [success=2 default=ignore] u.so
+auth required /lib/security/$ISA/pam_access.so
+auth required b.so [x  y]
+auth required c.so
+"""
+JUMP_LOSS = ("auth: the jump 'success=2' of '[success=2 default=ignore] u.so' would land "
+             "elsewhere")
+
 STOCK_PAM = """#
 # A policy as Debian's are.
 auth       optional   pam_faildelay.so  delay=3000000
@@ -117,9 +129,7 @@ class Plan(Case):
 
     def test_every_loss_is_named(self):
         set_up(nss="passwd: files\ngroup: files\nhosts: files [NOTFOUND=return] dns\n",
-               pam="# one\nauth [success=2 default=ignore] u.so\n"
-                   "auth required /lib/security/$ISA/pam_access.so\nauth required b.so [x  y]\n"
-                   "auth required c.so\n")
+               pam="# one\n" + JUMPING_PAM)
         losses = {file["path"]: file["losses"] for file in ask("plan", AD)["files"]}
         self.assertIn("account: the policy 'other', which decides where there is no entry, would "
                       "no longer", losses[str(PAM)])
@@ -127,21 +137,19 @@ class Plan(Case):
         document = self.unchanged("plan", AD)
         self.assertEqual(LOSS, document["exit"])
         losses = {file["path"]: file["losses"] for file in document["files"]}
-        self.assertEqual(["hosts: service 'dns' would be lost",
-                          "shadow: the default 'files', which holds without a line, would be lost"],
-                         losses[str(NSS)])
-        self.assertEqual(["auth: entry 'required b.so [x  y]' would become 'required b.so [x y]'"],
-                         losses[str(PAM)])
-        notes = [note for file in document["files"] for note in file["notes"]]
-        self.assertEqual(["1 comment without effect on the system would be dropped"], notes)
+        self.assertEqual({str(PAM): [JUMP_LOSS], str(NSS): [], str(RECORD): []}, losses)
+        self.assertEqual([], [note for file in document["files"] for note in file["notes"]])
 
-    def test_a_refusal_of_a_reader_is_told(self):
-        set_up(nss=PLAIN_NSS + "gshadow: files\n")
+    def test_a_file_that_its_readers_understand_differently_is_refused(self):
+        set_up(nss=TWICE_NSS)
         document = self.unchanged("plan", AD)
         self.assertEqual(REFUSED, document["exit"])
-        self.assertEqual({"message": "Invalid Database: gshadow", "afterwards": False,
-                          "exception": "SystemConfiguration::InvalidDatabaseException"},
+        self.assertEqual({"message": "The service 'extrausers' has no place in 'passwd' where all "
+                                     "readers of the file find it",
+                          "afterwards": False,
+                          "exception": "tessel::authentication::ConfigurationError"},
                          document["refusal"])
+        self.assertIn(b"tslauthctl prepare", run("plan", AD).stderr)
 
     def test_an_unknown_recorded_store_is_refused_after_the_record(self):
         set_up(store="Example Store")
@@ -183,28 +191,44 @@ class Plan(Case):
 
 class Activate(Case):
     def test_a_file_with_a_loss_is_left_alone_unless_it_is_accepted(self):
-        set_up(nss=PLAIN_NSS.replace("hosts: files", "hosts: files [NOTFOUND=return] dns"))
+        set_up(pam=JUMPING_PAM + "account required c.so\n")
         document = self.unchanged("activate", AD)
         self.assertEqual(LOSS, document["exit"])
-        self.assertEqual([{"path": str(NSS), "loss": "hosts: service 'dns' would be lost"}],
-                         document["losses"])
+        self.assertEqual([{"path": str(PAM), "loss": JUMP_LOSS}], document["losses"])
         process = run("activate", AD)
-        self.assertIn(b"hosts: service 'dns' would be lost", process.stderr)
+        self.assertIn(JUMP_LOSS.encode(), process.stderr)
         self.assertEqual(DONE, ask("activate", AD, "--accept-loss")["exit"])
-        self.assertIn("hosts: files [NOTFOUND=return]\n", NSS.read_text())
+        self.assertIn("pam_pwdfile.so", PAM.read_text())
 
-    def test_what_would_be_lost_on_the_way_back_counts(self):
-        set_up(nss=PLAIN_NSS.replace("passwd: files", "passwd: files [NOTFOUND=return]"))
-        self.assertEqual(["passwd: service 'files [NOTFOUND=return]' would be lost (when the store "
-                          "is left again)"],
-                         [loss["loss"] for loss in self.unchanged("activate", AD)["losses"]])
+    def test_there_and_back_loses_nothing_of_a_stock_debian_host(self):
+        set_up(pam=STOCK_PAM, nss=STOCK_NSS)
+        os.chown(NSS, 12, 34)
+        os.chmod(NSS, 0o640)
+        before = texts()
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+        self.assertEqual(DONE, ask("status")["exit"])
+        for path in (PAM, NSS):
+            lines = path.read_bytes().splitlines()
+            for line in before[str(path)].splitlines():
+                edited = path == NSS and line.startswith((b"passwd:", b"group:", b"shadow:"))
+                self.assertEqual(not edited, line in lines, line)
+        self.assertEqual(DONE, ask("activate", "None")["exit"])
+        self.assertEqual(before, texts())
+        status = NSS.stat()
+        self.assertEqual((12, 34, 0o640), (status.st_uid, status.st_gid, status.st_mode & 0o7777))
 
-    def test_a_second_refusal_does_not_leave_half_of_it(self):
-        set_up(nss=PLAIN_NSS + "odd: files\n")
+    def test_a_file_in_which_nothing_changes_is_not_written(self):
+        ask("activate", AD)
+        before = state((PAM, NSS))
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+        self.assertEqual(before, state((PAM, NSS)))
+
+    def test_a_refusal_leaves_everything_alone_whatever_is_accepted(self):
+        set_up(nss=TWICE_NSS)
         for arguments in (("activate", AD), ("activate", AD, "--accept-loss")):
             document = self.unchanged(*arguments)
             self.assertEqual(REFUSED, document["exit"])
-            self.assertEqual("SystemConfiguration::InvalidDatabaseException",
+            self.assertEqual("tessel::authentication::ConfigurationError",
                              document["error"]["exception"])
 
     def test_an_unknown_recorded_store_is_left_with_its_refusal(self):
@@ -257,7 +281,6 @@ class Activate(Case):
 class Prepare(Case):
     def test_a_stock_debian_host_goes_all_the_way(self):
         set_up(pam=STOCK_PAM, nss=STOCK_NSS)
-        self.assertEqual(REFUSED, self.unchanged("activate", AD)["exit"])
         shown = self.unchanged("prepare")
         self.assertEqual(CHANGES, shown["exit"], shown)
         os.chown(NSS, 12, 34)

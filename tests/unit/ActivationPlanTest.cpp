@@ -100,6 +100,73 @@ TEST(ActivationPlanTest, AnActivationEditsThePolicyTheSwitchAndTheRecordInThisOr
     EXPECT_EQ("remote-authentication-store = \"Active Directory\"\n", preview.files[2].after);
 }
 
+/// A host as Debian installs it, which no model can read.
+Files const stock = {
+    {{Paths::PAMPolicy,
+      "# who may log in\n@include common-auth\nauth required "
+      "/lib/security/$ISA/pam_access.so \\\n  nodefgroup\n-session optional s.so\n"},
+     {Paths::NSSConfiguration, "passwd:         files systemd\ngroup:          files systemd\n"
+                               "shadow:         files systemd\ngshadow:        files systemd\n\n"
+                               "hosts:          files mdns4_minimal [NOTFOUND=return] dns"},
+     {Paths::AuthenticationConfiguration, record}}};
+
+TEST(ActivationPlanTest, TheLosslessFormChangesOnlyTheLinesConcernedAndLosesNothing) {
+    auto const plan = ActivationPlan::Activating(provider, "Active Directory", EditForm::Lossless);
+    auto const preview = plan.Preview(stock);
+    EXPECT_FALSE(preview.refusal);
+    EXPECT_FALSE(preview.Loses());
+    ASSERT_EQ(preview.files.size(), 3U);
+    EXPECT_EQ(preview.files[0].after,
+              "# who may log in\naccount\tsufficient\t/lib/security/$ISA/pam_prov.so\ta \n"
+              "@include common-auth\nauth required /lib/security/$ISA/pam_access.so \\\n"
+              "  nodefgroup\nauth\tsufficient\t/lib/security/$ISA/pam_prov.so\ta \n"
+              "-session optional s.so\n");
+    EXPECT_EQ(preview.files[1].after,
+              "passwd:         prov files systemd\ngroup:          prov files systemd\n"
+              "shadow:         prov files systemd\ngshadow:        files systemd\n\n"
+              "hosts:          files mdns4_minimal [NOTFOUND=return] dns");
+    EXPECT_THAT(preview.files[0].notes, IsEmpty());
+
+    Files active = stock;
+    for (auto const& file : preview.files) {
+        active.texts[file.path] = file.after;
+    }
+    auto const back = ActivationPlan::Withdrawing(provider, EditForm::Lossless).Preview(active);
+    EXPECT_FALSE(back.Loses());
+    for (auto const& file : back.files) {
+        EXPECT_EQ(file.after, stock(file.path));
+    }
+    EXPECT_TRUE(ActivationPlan::Activating(provider, "Active Directory").Preview(stock).refusal);
+}
+
+TEST(ActivationPlanTest, TheLosslessFormTakesOutEveryCopyAndThatIsNoLoss) {
+    std::string const entry = "auth sufficient /lib/security/$ISA/pam_prov.so a\n";
+    Files const files = {{{Paths::PAMPolicy, entry + "auth required u.so\n" + entry},
+                          {Paths::NSSConfiguration, "passwd: prov files prov\ngroup: files\n"}}};
+    auto const preview = ActivationPlan::Withdrawing(provider, EditForm::Lossless).Preview(files);
+    EXPECT_FALSE(preview.Loses());
+    EXPECT_EQ(preview.files[0].after, "auth required u.so\n");
+    EXPECT_EQ(preview.files[1].after, "passwd: files\ngroup: files\n");
+}
+
+TEST(ActivationPlanTest, TheLosslessFormNamesAJumpThatWouldLandElsewhere) {
+    Files files = usual;
+    files.texts[Paths::PAMPolicy] =
+        "auth [success=2 default=ignore] u.so\nauth required /lib/security/$ISA/pam_access.so\n"
+        "auth required a.so\nauth required b.so\naccount required a.so\n";
+    auto const preview =
+        ActivationPlan::Activating(provider, "Active Directory", EditForm::Lossless).Preview(files);
+    EXPECT_THAT(preview.files[0].losses, ElementsAre(HasSubstr("would land elsewhere")));
+}
+
+TEST(ActivationPlanTest, TheLosslessFormRefusesWhatItsReadersUnderstandDifferently) {
+    Files files = usual;
+    files.texts[Paths::NSSConfiguration] += "passwd: files\n";
+    EXPECT_TRUE(IsRefusedBy<ConfigurationError>(
+        ActivationPlan::Activating(provider, "Active Directory", EditForm::Lossless)
+            .Preview(files)));
+}
+
 TEST(ActivationPlanTest, AWithdrawalEditsThePolicyAndThenTheSwitchAndNoRecord) {
     Files active = usual;
     for (auto const& file :

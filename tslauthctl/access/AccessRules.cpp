@@ -65,7 +65,8 @@ Kind ReadLine(std::string_view line, AccessRule& rule) {
     if (names.empty() || line.empty() || (sign.front() != '+' && sign.front() != '-')) {
         return Kind::faulty;
     }
-    // By the line's first character: one with a separator before its sign denies, whatever the sign.
+    // By the line's first character: one with a separator before its sign denies, whatever the
+    // sign.
     rule.permits = first == '+';
     rule.origins = line;
     bool excepted = false;
@@ -145,8 +146,8 @@ std::vector<Line> LinesWithout(bool permits, std::string_view name, std::string_
     return LinesOf(Joined(lines));
 }
 
-/// Whether a plain rule permits or denies exactly this name, and none before it decides otherwise: a
-/// permission counts before one for everybody, a denial before any permission.
+/// Whether a plain rule permits or denies exactly this name, and none before it decides otherwise:
+/// a permission counts before one for everybody, a denial before any permission.
 bool Has(bool permits, std::string_view name, std::vector<Line> const& lines) {
     for (auto const& line : lines) {
         if (!line.rule) {

@@ -7,8 +7,9 @@
 #include <string_view>
 #include <vector>
 
-/// Who may log in: the rules of pam_access, read and edited as text. They are understood as that module
-/// understands them with `listsep=,` and `nodefgroup`, which the policy gives it (Linux-PAM 1.5):
+/// Who may log in: the rules of pam_access, read and edited as text. They are understood as that
+/// module understands them with `listsep=,` and `nodefgroup`, which the policy gives it (Linux-PAM
+/// 1.5):
 /// - the first rule that fits a user and where he comes from decides; who fits none may log in;
 /// - a rule is one line of three fields, with ":" between them; the third may hold more of them;
 /// - names are separated by commas alone, and blanks belong to them;
@@ -29,8 +30,8 @@ std::string RuleName(Subject const& subject);
 /// Everybody, of trusted domains too.
 Subject Everybody();
 
-/// Whether a name can stand in a rule at all: one with a comma, a colon or a control character would
-/// be read as something else, and so would a user's with "@" or in parentheses.
+/// Whether a name can stand in a rule at all: one with a comma, a colon or a control character
+/// would be read as something else, and so would a user's with "@" or in parentheses.
 bool CanStandInARule(Subject const& subject);
 
 struct AccessRule {
@@ -61,12 +62,12 @@ AccessRules ReadAccessRules(std::string_view text);
 /// The file with which a host begins: nobody of the domain may log in.
 std::string FirstAccessRules();
 
-/// Each returns the text with as few lines changed as do it, and the same text where nothing has to be
-/// changed.
+/// Each returns the text with as few lines changed as do it, and the same text where nothing has to
+/// be changed.
 ///
 /// `Permitted`: takes back a denial of `subject`, and puts a rule for it before the last one.
-/// `Denied`: takes back a permission of `subject`, and puts a rule before all others, so that a group
-/// which may log in does not let its member in.
+/// `Denied`: takes back a permission of `subject`, and puts a rule before all others, so that a
+/// group which may log in does not let its member in.
 std::string Permitted(std::string_view text, Subject const& subject);
 std::string Denied(std::string_view text, Subject const& subject);
 /// Takes back every permission; denials and comments stay.

@@ -7,8 +7,8 @@
 #include <optional>
 #include <string>
 
-/// Where the record of a host that was set up is kept, as an administrator can read it: one document,
-/// and the files below "before" and "after" under their own paths.
+/// Where the record of a host that was set up is kept, as an administrator can read it: one
+/// document, and the files below "before" and "after" under their own paths.
 namespace tessel::tslauthctl {
 
 /// Nothing where the host was not set up.

@@ -15,6 +15,7 @@
 #include <chrono>
 #include <csignal>
 #include <fcntl.h>
+#include <iterator>
 #include <poll.h>
 #include <spawn.h>
 #include <sys/stat.h>
@@ -62,19 +63,22 @@ std::string ReadDefaultPolicy() {
     return std::move(*text);
 }
 
-/// Whether libpam finds the access module by the name that the policy gives it. Debian's, which has
-/// its modules in a folder of the architecture, looks in one place alone.
-/// @throws Failure where there is no such module
-bool FindsModules(std::string const& folder) {
-    auto const inFolder = folder + "/" + Paths::PAMAccessModule;
-    if (Exists(inFolder)) {
-        return Exists(std::string(Paths::ModuleLink) + "/" + Paths::PAMAccessModule);
+/// The links that lead nowhere. Debian's libpam, which has its modules in a folder of the
+/// architecture, looks in one place alone.
+/// @throws Failure where there is no module to lead to
+std::vector<std::string> MissingLinks(std::string const& folder) {
+    auto const isThere = [](std::string const& in) {
+        return Exists(in + "/" + Paths::PAMAccessModule);
+    };
+    std::vector<std::string> missing;
+    if (isThere(folder)) {
+        std::remove_copy_if(std::begin(Paths::ModuleLinks), std::end(Paths::ModuleLinks),
+                            std::back_inserter(missing), isThere);
+    } else if (IsMissingPAMModule(std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule)) {
+        throw Failure(ExitCode::refused, "There is no '" + folder + "/" + Paths::PAMAccessModule +
+                                             "', which decides who may log in");
     }
-    if (IsMissingPAMModule(std::string(Paths::PAMModulePrefix) + Paths::PAMAccessModule)) {
-        throw Failure(ExitCode::refused,
-                      "There is no '" + inFolder + "', which decides who may log in");
-    }
-    return true;
+    return missing;
 }
 
 /// Owns a process that was started.
@@ -189,7 +193,7 @@ SetupFacts ReadSetupFacts(std::string const& provider) {
         facts.texts[path] = TextOnHost(path);
     }
     facts.moduleFolder = "/lib/" TSLAUTH_LIBRARY_ARCHITECTURE "/security";
-    facts.findsModules = FindsModules(facts.moduleFolder);
+    facts.missingLinks = MissingLinks(facts.moduleFolder);
     for (auto const* const profile : Paths::Profiles) {
         if (Exists(Paths::ProfileProgram) && Exists(std::string(Paths::ProfileFolder) + profile)) {
             facts.profiles.emplace_back(profile);

@@ -11,8 +11,8 @@
 /// The host that is set up: what is read of it, and each way in which it is changed.
 namespace tessel::tslauthctl {
 
-/// @throws Failure where the provider, the default policy or libpam's modules are not installed, or a
-///     file cannot be read
+/// @throws Failure where the provider, the default policy or libpam's modules are not installed, or
+///     a file cannot be read
 SetupFacts ReadSetupFacts(std::string const& provider);
 
 /// A file's text; nothing where there is none.

@@ -29,8 +29,9 @@ inline constexpr char ProfileFolder[] = "/usr/share/pam-configs/";
 inline constexpr char const* Profiles[] = {"tslauth", "tslauth-password"};
 inline constexpr char ProfileProgram[] = "/usr/sbin/pam-auth-update";
 
-/// Debian's libpam looks for "/lib/security/$ISA/" here.
-inline constexpr char ModuleLink[] = "/lib/security/lib/security";
+/// Where Debian's libpam looks for "/lib/security/$ISA/": that of Debian 12, and that of 13.
+inline constexpr char const* ModuleLinks[] = {"/lib/security/lib/security",
+                                              "/lib/security/usr/lib/security"};
 
 /// What the host was before it was set up, and what setting up made of it.
 inline constexpr char SetupRecord[] = "/var/lib/tslauth/setup";

@@ -223,7 +223,7 @@ std::vector<std::string> SetupPaths() {
 }
 
 bool SetupPlan::Changes() const {
-    return !link.empty() || !profilesOn.empty() ||
+    return !links.empty() || !profilesOn.empty() ||
            std::any_of(files.begin(), files.end(),
                        [](FileChange const& change) { return change.Changes(); });
 }
@@ -236,10 +236,8 @@ SetupPlan MakeSetupPlan(SetupFacts const& facts) {
     if (services && !facts.asked.replacedService.empty()) {
         plan.files.push_back(PlanNSS(*services, facts.asked.replacedService));
     }
-    if (!facts.findsModules) {
-        plan.link = Paths::ModuleLink;
-        plan.linkTarget = facts.moduleFolder;
-    }
+    plan.links = facts.missingLinks;
+    plan.linkTarget = facts.moduleFolder;
     PlanServices(facts, plan);
     return plan;
 }

@@ -10,8 +10,8 @@
 #include <string_view>
 #include <vector>
 
-/// What makes a host ready for a provider: its files, and the services that follow the policy. Texts
-/// in, texts out; no file is opened here.
+/// What makes a host ready for a provider: its files, and the services that follow the policy.
+/// Texts in, texts out; no file is opened here.
 namespace tessel::tslauthctl {
 
 /// What a provider asks of a host beyond its entries, by a file of its own.
@@ -19,8 +19,8 @@ struct ProviderSetup {
     /// Entries of the policy that stand first among those of their facility, whichever store is
     /// active.
     std::vector<std::string> policyLines;
-    /// A profile of pam-auth-update that is switched off while ours is on, and the module by which it
-    /// is known; empty for none.
+    /// A profile of pam-auth-update that is switched off while ours is on, and the module by which
+    /// it is known; empty for none.
     std::string replacedProfile;
     std::string replacedModule;
     /// A service that is taken out of the name-service switch; empty for none.
@@ -40,8 +40,9 @@ struct SetupFacts {
     std::string defaultPolicy;
     /// By path; nothing for a file that is not there.
     std::map<std::string, std::optional<std::string>> texts;
-    /// Whether libpam finds the access module by the name that the policy gives it.
-    bool findsModules = false;
+    /// Folders, each to be a link, in which builds of libpam look for what the policy names, and do
+    /// not find it.
+    std::vector<std::string> missingLinks;
     /// Where libpam's modules are.
     std::string moduleFolder;
     /// Those of pam-auth-update that are installed.
@@ -65,11 +66,11 @@ struct FileChange {
 struct SetupPlan {
     /// In the order in which they are written; unchanged ones, too.
     std::vector<FileChange> files;
-    /// A symbolic link that is made first, and where it leads; empty for none.
-    std::string link;
+    /// Symbolic links that are made first, and where they lead.
+    std::vector<std::string> links;
     std::string linkTarget;
-    /// Profiles that pam-auth-update switches on and, where they are on, off; both are empty where all
-    /// is as it should.
+    /// Profiles that pam-auth-update switches on and, where they are on, off; both are empty where
+    /// all is as it should.
     std::vector<std::string> profilesOn;
     std::vector<std::string> profilesOff;
     /// What is left to the administrator.
@@ -88,8 +89,8 @@ bool AsksAccessRules(meaning::PAMMeaning const& policy);
 /// The default policy with a provider's lines in it.
 std::string PolicyWith(std::vector<std::string> const& lines, std::string_view policy);
 
-/// The kinds of services that do not follow the policy, by the files that they include: the names of
-/// those of `texts` that do not lead to it.
+/// The kinds of services that do not follow the policy, by the files that they include: the names
+/// of those of `texts` that do not lead to it.
 std::vector<std::string>
 FilesThatDoNotFollow(std::map<std::string, std::optional<std::string>> const& texts);
 

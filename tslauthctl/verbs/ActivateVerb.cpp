@@ -57,7 +57,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
             console.ErrorDetail("with --accept-loss 'None' is recorded all the same, and the "
                                 "provider's entries stay in the files");
         }
-        AddPrepareHint(*plan.refusal, console);
+        AddPrepareHint(plan, console);
         return ExitCode::refused;
     }
     if (plan.preview.Loses() && !acceptLoss) {

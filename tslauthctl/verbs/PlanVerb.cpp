@@ -6,12 +6,12 @@
 
 namespace tessel::tslauthctl {
 
-void AddPrepareHint(Failure const& refusal, Console& console) {
-    bool const reader = refusal.ExceptionClass().rfind("SystemConfiguration::", 0) == 0 ||
-                        refusal.ExceptionClass() == "std::out_of_range";
+void AddPrepareHint(HostPlan const& plan, Console& console) {
+    // Once the store is known, no file is read but the two that an activation edits.
+    bool const reader = plan.recorded && plan.refusal->ExceptionClass() ==
+                                             "tessel::authentication::ConfigurationError";
     if (reader) {
-        console.ErrorDetail(
-            "'tslauthctl prepare' shows what keeps the library from reading a file");
+        console.ErrorDetail("'tslauthctl prepare' shows what can be done about the file");
     }
 }
 
@@ -61,7 +61,7 @@ ExitCode RunPlan(std::string const& store, Console& console) {
         console.ErrorDetail(plan.refusedAfterwards
                                 ? "the library would write the above first, and then refuse"
                                 : "the library would refuse; nothing would be changed");
-        AddPrepareHint(*plan.refusal, console);
+        AddPrepareHint(plan, console);
         return ExitCode::refused;
     }
     if (plan.preview.Loses()) {

@@ -30,9 +30,9 @@ void Describe(SetupPlan const& plan, std::string const& provider, Console& conso
                                      {"changed", file.Changes()},
                                      {"diff", diff}});
     }
-    document["link"] = nullptr;
-    if (!plan.link.empty()) {
-        document["link"] = {{"path", plan.link}, {"target", plan.linkTarget}};
+    document["links"] = nlohmann::json::array();
+    for (auto const& link : plan.links) {
+        document["links"].push_back({{"path", link}, {"target", plan.linkTarget}});
     }
     document["profiles_on"] = plan.profilesOn;
     document["profiles_off"] = plan.profilesOff;
@@ -49,8 +49,8 @@ std::string Listed(std::vector<std::string> const& names) {
 
 /// What a plan would do beside its files, for people.
 void SayWhatElse(SetupPlan const& plan, Console& console) {
-    if (!plan.link.empty()) {
-        console.Note(plan.link + " would lead to " + plan.linkTarget);
+    for (auto const& link : plan.links) {
+        console.Note(link + " would lead to " + plan.linkTarget);
     }
     if (!plan.profilesOn.empty()) {
         console.Note(
@@ -77,9 +77,9 @@ SetupRecord RecordFor(SetupPlan const& plan, SetupFacts const& facts) {
             addFolders(file.path);
         }
     }
-    if (!plan.link.empty()) {
-        record.links.push_back(plan.link);
-        addFolders(plan.link);
+    for (auto const& link : plan.links) {
+        record.links.push_back(link);
+        addFolders(link);
     }
     if (!plan.profilesOn.empty()) {
         for (auto const* const path : Paths::ServicePolicies) {
@@ -125,8 +125,8 @@ void CarryOut(SetupPlan const& plan, SetupFacts const& facts) {
     for (auto const& folder : record.folders) {
         MakeFolder(folder);
     }
-    if (!plan.link.empty()) {
-        MakeLink(plan.link, plan.linkTarget);
+    for (auto const& link : plan.links) {
+        MakeLink(link, plan.linkTarget);
     }
     for (auto const& file : plan.files) {
         if (file.Changes()) {

@@ -85,8 +85,8 @@ ExitCode RunCAMDomain(std::string const& server, Limit limit, Console& console);
 /// "files" and "refusal".
 void DescribePlan(HostPlan const& plan, Console& console);
 
-/// Below a refusal that comes from the reader of a system file.
-void AddPrepareHint(Failure const& refusal, Console& console);
+/// Below a plan's refusal: what helps where it is a system file that cannot be edited.
+void AddPrepareHint(HostPlan const& plan, Console& console);
 
 } // namespace tessel::tslauthctl
 
