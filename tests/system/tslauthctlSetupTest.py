@@ -206,6 +206,18 @@ class SetupTest(unittest.TestCase):
             self.assertFalse(log_in("lena", "authenticate", password="wrong", service=service))
         self.assertFalse(pathlib.Path("/run/asked").exists())
 
+    def test_without_the_providers_module_local_users_log_in_and_nobody_of_the_domain(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        module = next(pathlib.Path("/usr/lib").glob("*/security/pam_tslauth_winbind.so"))
+        away = module.rename(module.with_suffix(".away"))
+        try:
+            for service in (SERVICE, "setup-test-direct"):
+                self.assertTrue(log_in("root", "acct_mgmt", service=service), service)
+                self.assertFalse(log_in(USER, "acct_mgmt", service=service), service)
+        finally:
+            away.rename(module)
+
     def test_nobody_of_the_domain_logs_in_until_permitted(self):
         self.set_up_and_activate()
         self.assertFalse(log_in(USER, "authenticate"))
