@@ -123,7 +123,8 @@ def plain_join(lab, host):
 def is_activated(host):
     policy = host.read("/etc/pam.d/system-auth-generic")
     for facility in ("auth", "account"):
-        expect(f"{facility}\tsufficient\t/lib/security/$ISA/pam_tslauth_winbind.so" in policy, policy)
+        expect(f"{facility}\tsufficient\t/lib/security/$ISA/pam_tslauth_winbind.so" in policy,
+               policy)
     switch = host.read("/etc/nsswitch.conf")
     for database in ("passwd", "group", "shadow"):
         expect(f"{database}: tslauth_winbind files\n" in switch, switch)

@@ -79,7 +79,8 @@ def make_server(host):
 
 def by_key(host, user, *command):
     return host.run("ssh", "-i", KEY, "-o", "BatchMode=yes", "-o", "StrictHostKeyChecking=no",
-                    "-o", "UserKnownHostsFile=/dev/null", "-l", user, "127.0.0.1", *(command or ("id", "-un")), timeout=90)
+                    "-o", "UserKnownHostsFile=/dev/null", "-l", user, "127.0.0.1",
+                     *(command or ("id", "-un")), timeout=90)
 
 
 def is_let_in(host, user, name=None):

@@ -57,13 +57,15 @@ def play(lab):
     with lab.step("bash completes commands and options by the tool's own help"):
         words = host.shell("""
             source /usr/share/bash-completion/completions/tslauthctl
-            COMP_WORDS=(tslauthctl sta) COMP_CWORD=1; _tslauthctl tslauthctl sta; echo "${COMPREPLY[*]}"
+            COMP_WORDS=(tslauthctl sta) COMP_CWORD=1
+            _tslauthctl tslauthctl sta; echo "${COMPREPLY[*]}"
             COMP_WORDS=(tslauthctl join --pass) COMP_CWORD=2; _tslauthctl tslauthctl --pass
             echo "${COMPREPLY[*]}"
             """).out
         expect_equal(words, "status\n--password-stdin --password-file --password-fd\n", "words")
     with lab.step("zsh has its completions as well"):
-        host.ok("grep", "-qx", "#compdef tslauthctl", "/usr/share/zsh/vendor-completions/_tslauthctl")
+        host.ok("grep", "-qx", "#compdef tslauthctl",
+                "/usr/share/zsh/vendor-completions/_tslauthctl")
     with lab.step("the libraries for 32-bit programs are installed beside them"):
         host.ok("dpkg", "--add-architecture", "i386")
         host.apt("update")
@@ -72,7 +74,8 @@ def play(lab):
                "they are not both installed")
         host.ok("test", "-e", "/usr/lib/i386-linux-gnu/libtslauth.so.1")
         missing = host.shell("readelf -d /usr/lib/i386-linux-gnu/libtslauth.so.1 2>/dev/null ||"
-                             " /lib/ld-linux.so.2 --list /usr/lib/i386-linux-gnu/libtslauth.so.1").out
+                             " /lib/ld-linux.so.2 --list"
+                              " /usr/lib/i386-linux-gnu/libtslauth.so.1").out
         expect("not found" not in missing, missing)
     with lab.step("they go again"):
         host.apt("purge", "--autoremove", "libtslauth1:i386", "libstrandctl1:i386")
@@ -91,7 +94,8 @@ def play(lab):
         expect(not changed, f"{changed}\n" + host.difference("before", *changed))
     with lab.step("nothing of ours is left anywhere"):
         left = host.shell("find / -xdev \\( -path /srv -o -path /proc -o -path /var/log"
-                          " -o -path /var/lib/apt \\) -prune -o -name '*tslauth*' -print -o -name 'tessel*'"
+                          " -o -path /var/lib/apt \\) -prune"
+                           " -o -name '*tslauth*' -print -o -name 'tessel*'"
                           " -print").out
         expect(left in ("",), left)
     host.down()

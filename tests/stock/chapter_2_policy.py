@@ -1,5 +1,5 @@
 # SPDX-License-Identifier: Apache-2.0
-"""The services follow the policy, whatever else is installed, and a lost policy locks nobody out."""
+"""The services follow the policy, whatever is installed, and a lost policy locks nobody out."""
 import time
 
 from lab import LOCAL_PASSWORD, expect, until
@@ -98,11 +98,12 @@ def play(lab):
         lose_policy(host, watched=True)
         policy_is_back(host)
     with lab.step("the system log says so"):
-        until("a line of it", lambda: "was missing" in host.ok("journalctl", "-q", "-t", "tslauth").out)
+        until("a line of it",
+              lambda: "was missing" in host.ok("journalctl", "-q", "-t", "tslauth").out)
     with lab.step("a job of lena's has run from cron"):
         job_has_run(host)
     lose_policy(host, watched=False)
-    with lab.step("while it is missing, with nothing that watches: local users log in all the same"):
+    with lab.step("while it is missing, with nothing that watches: local users log in as ever"):
         host.locals_are_well()
         host.wrong_passwords_are_refused()
     with lab.step("and somebody unknown is refused"):

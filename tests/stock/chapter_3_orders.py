@@ -13,7 +13,8 @@ def is_safe(host):
 
 def is_none(host):
     """The host lets in its own users, and no entry of the provider is left."""
-    expect("tslauth_winbind" not in host.read("/etc/nsswitch.conf"), host.read("/etc/nsswitch.conf"))
+    services = host.read("/etc/nsswitch.conf")
+    expect("tslauth_winbind" not in services, services)
     if host.run("test", "-e", POLICY).code == 0:
         # Entries that an activation makes have this form; those of the set-up stay with it.
         expect("$ISA/pam_tslauth_winbind" not in host.read(POLICY), host.read(POLICY))
@@ -47,7 +48,8 @@ def play(lab):
         host.follows()
         is_safe(host)
     with lab.step("the older ones come back (downgrade)"):
-        host.apt("install", "--allow-downgrades", *host.files("libtslauth1", "libstrandctl1", "tslauthctl",
+        host.apt("install", "--allow-downgrades",
+                 *host.files("libtslauth1", "libstrandctl1", "tslauthctl",
                                                               "tslauth-provider-winbind"))
         expect(host.is_active(), "it is active no longer")
         is_safe(host)

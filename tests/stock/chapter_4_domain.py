@@ -19,7 +19,8 @@ def give_key(host, user):
     host.shell("""
         key=/root/domain
         [ -e "$key" ] || ssh-keygen -q -t ed25519 -N '' -f "$key"
-        echo 'AuthorizedKeysFile .ssh/authorized_keys /etc/ssh/keys/%u' >/etc/ssh/sshd_config.d/keys.conf
+        echo 'AuthorizedKeysFile .ssh/authorized_keys /etc/ssh/keys/%u' \\
+            >/etc/ssh/sshd_config.d/keys.conf
         install -d -m 0755 /etc/ssh/keys
         install -m 0644 "$key.pub" "/etc/ssh/keys/$1"
         systemctl reload ssh
@@ -115,7 +116,7 @@ def play(lab):
         until("user1 resolves", lambda: host.run("getent", "passwd", USER).code == 0, seconds=30)
         expect_equal(host.ssh(USER, PASSWORD).code, 0, "ssh")
         host.locals_are_well()
-    with lab.step("the policy is lost while active: users of the domain are refused, local ones not"):
+    with lab.step("the policy is lost while active: domain users are refused, local ones not"):
         host.shell('systemctl stop tslauth-policy.path; mv "$1" /srv/policy', POLICY)
         refused(host, USER, PASSWORD)
         host.locals_are_well()

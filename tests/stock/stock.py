@@ -96,7 +96,8 @@ class StockHost(Node):
             sed -i 's/^Version: .*/&+later/' root/DEBIAN/control
             # Ours ask for each other's very version.
             case $1 in
-                *tslauth* | libstrandctl1) sed -i 's/(= \([^)]*\))/(= \1+later)/' root/DEBIAN/control ;;
+                *tslauth* | libstrandctl1)
+                    sed -i 's/(= \([^)]*\))/(= \1+later)/' root/DEBIAN/control ;;
             esac
             dpkg-deb -b -Znone root "/srv/newer/later-$1.deb" >/dev/null
             echo "/srv/newer/later-$1.deb"
@@ -133,7 +134,8 @@ class StockHost(Node):
         seen = ""
         answers = list(answers)
         while True:
-            found = terminal.expect([wanted, r"(?i)password( for \S+)?: ?$", pexpect.EOF, pexpect.TIMEOUT,
+            found = terminal.expect([wanted, r"(?i)password( for \S+)?: ?$",
+                                     pexpect.EOF, pexpect.TIMEOUT,
                                      r"login: ?$"])
             seen += terminal.before or ""
             if found in (2, 3, 4):
@@ -160,7 +162,8 @@ class StockHost(Node):
 
     def becomes(self, user, target, password):
         """Whether su lets a user become another one with a password, and what it said."""
-        return self._asks(self.terminal("runuser", "-u", user, "--", "su", target, "-c", "echo now=$(id -un)"),
+        return self._asks(self.terminal("runuser", "-u", user, "--", "su", target,
+                                        "-c", "echo now=$(id -un)"),
                           [password], re.escape(f"now={target}"))
 
     def sudoes(self, user, password):
@@ -221,7 +224,8 @@ class StockHost(Node):
         """The services ask the policy, and Debian's own winbind profile is off."""
         for kind in ("auth", "account", "password", "session", "session-noninteractive"):
             text = self.read(f"/etc/pam.d/common-{kind}")
-            expect("substack\tsystem-auth-generic" in text, f"common-{kind} does not follow:\n{text}")
+            expect("substack\tsystem-auth-generic" in text,
+                   f"common-{kind} does not follow:\n{text}")
             expect("pam_winbind" not in text, f"Debian's winbind profile is on:\n{text}")
         expect(self.read(POLICY) != "", "the policy is empty")
 

@@ -125,9 +125,11 @@ class Membership(Case):
         again = self.join(password="wrong")
         self.assertEqual((DONE, True, True),
                          (again["exit"], again["joined"], again["already_joined"]))
-        document = ask("join", "other.test", "--user", "joiner", "--password-stdin", input=b"secret")
+        document = ask("join", "other.test", "--user", "joiner", "--password-stdin",
+                       input=b"secret")
         self.assertEqual(JOINED_ELSEWHERE, document["exit"])
-        self.assertEqual("The host is joined to example.test, and not to other.test; 'tslauthctl part' "
+        self.assertEqual("The host is joined to example.test, and not to other.test; "
+                         "'tslauthctl part' "
                          "takes it out", document["error"]["message"])
 
     def test_a_failure_tells_its_cause_in_the_providers_words(self):

@@ -285,7 +285,8 @@ class WhileWaiting(Case):
         terminal = self.terminal("canonical", "a", "--timeout", "3", columns=200)
         self.assertEqual(f"exit {UNREACHABLE}", terminal.event())
         shown = terminal.read(0.1)
-        self.assertRegex(shown, rb"\r\x1b\[Ktslauthctl: waiting for the provider to convert the name "
+        self.assertRegex(shown, rb"\r\x1b\[Ktslauthctl: "
+                         rb"waiting for the provider to convert the name "
                                 rb"of a user: [12] of 3 seconds \(\^C interrupts\)")
 
     def test_an_interrupt_ends_at_once_and_wipes_the_line(self):

@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-/// One line in the system log, facility authpriv, for each command that set out to change the host: who
-/// ran it, what it was, how it ended. Never a secret: no command takes one as an argument.
+/// One line in the system log, facility authpriv, for each command that set out to change the host:
+/// who ran it, what it was, how it ended. Never a secret: no command takes one as an argument.
 namespace tessel::tslauthctl::ChangeLog {
 
 /// Who a line names, by what the kernel and sudo say.

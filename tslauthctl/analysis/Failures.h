@@ -41,8 +41,8 @@ template <typename Call> auto Explaining(Account account, Call call) {
     }
 }
 
-/// Runs a call to the domain on this thread, and adds to its failure why the provider failed, in the
-/// provider's words.
+/// Runs a call to the domain on this thread, and adds to its failure why the provider failed, in
+/// the provider's words.
 /// @param domain a store or a provider
 template <typename Domain, typename Call>
 auto WithCause(Domain const& domain, Account account, Call call) {

@@ -95,7 +95,8 @@ void AddServices(HostFacts const& facts, std::vector<Finding>& findings) {
     }
 }
 
-/// Debian's own profile lets a domain's users in beside the policy, and asks them about local names.
+/// Debian's own profile lets a domain's users in beside the policy, and asks them about local
+/// names.
 void AddSambaProfile(HostFacts const& facts, std::vector<Finding>& findings) {
     for (auto const& [path, text] : facts.policies) {
         if (text && path != Paths::PAMPolicy && NamesModule(*text, SambaModule)) {

@@ -29,8 +29,8 @@ std::shared_ptr<authentication::ActiveDirectoryProvider> OpenProvider();
 /// @throws Failure, also where there is none (not joined) or the provider cannot tell (refused)
 std::string RequireDomain(Console& console, Limit limit);
 
-/// The same, where the host is known to be in a domain; nothing where it is in none, or the provider
-/// does not answer.
+/// The same, where the host is known to be in a domain; nothing where it is in none, or the
+/// provider does not answer.
 std::optional<authentication::Domain> KnownDomain(Console& console, Limit limit);
 
 /// Whether the provider says that the host is in no domain; false where it does not answer.

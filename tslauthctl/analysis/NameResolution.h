@@ -11,8 +11,8 @@
 namespace tessel::tslauthctl {
 
 /// The names that a hosts file gives to `address` beside those that `kept` begins with up to their
-/// first "." and `kept` itself, each once, in the order of the file. A join drops them: the entry of
-/// the management address then names the host alone.
+/// first "." and `kept` itself, each once, in the order of the file. A join drops them: the entry
+/// of the management address then names the host alone.
 std::vector<std::string> OtherNames(std::string_view hosts, std::string const& address,
                                     std::string const& hostName);
 

@@ -6,9 +6,9 @@
 
 namespace tessel::tslauthctl {
 
-/// Refuses a configured provider that this process must not load: one outside the providers' folder,
-/// and one whose loading ends or hangs a process, which a child finds out. Whatever else is wrong
-/// with it, the library says.
+/// Refuses a configured provider that this process must not load: one outside the providers'
+/// folder, and one whose loading ends or hangs a process, which a child finds out. Whatever else is
+/// wrong with it, the library says.
 ///
 /// To be called while the process has no other threads.
 /// @throws Failure (refused)

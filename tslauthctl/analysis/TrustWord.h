@@ -4,8 +4,8 @@
 
 namespace tessel::tslauthctl {
 
-/// The state of a host's trust as a word, the same for every provider; "other" for a number that is a
-/// provider's own.
+/// The state of a host's trust as a word, the same for every provider; "other" for a number that is
+/// a provider's own.
 char const* TrustWord(int state) noexcept;
 
 } // namespace tessel::tslauthctl

@@ -232,8 +232,9 @@ public:
     /// @throws what `CAMProxy`'s operations throw
     std::string GetDomainForCAMService(std::string const& serverAddress) const;
 
-    /// Why the last of the provider's operations that failed on this thread did so, in the provider's
-    /// own words; empty where it does not tell. Not for the questions that run on workers.
+    /// Why the last of the provider's operations that failed on this thread did so, in the
+    /// provider's own words; empty where it does not tell. Not for the questions that run on
+    /// workers.
     std::string GetLastFailure() const;
 
 private:

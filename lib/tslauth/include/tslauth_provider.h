@@ -173,8 +173,8 @@ typedef struct ActiveDirectoryClientMetadataRecord {
     /* Its parameters, separated by white space; there is no quoting. May be null: none. Leave it
      * null: they are written as "[" + parameters + "]" behind the name, which to the C library are
      * actions of that service, and the library's reader passes over the services behind a bracket.
-     * So an activation that is repeated or taken back drops "files" from "passwd", and with it every
-     * local user; tslauthctl refuses such a provider. */
+     * So an activation that is repeated or taken back drops "files" from "passwd", and with it
+     * every local user; tslauthctl refuses such a provider. */
     char const* nssModuleParameters;
 } ActiveDirectoryClientMetadataRecord;
 
