@@ -152,6 +152,12 @@ class SetupTest(unittest.TestCase):
         self.assertEqual(done["profiles_off"], ["winbind"])
         self.assertTrue((LINK / "pam_access.so").exists())
 
+    def test_status_finds_nothing_of_a_store_in_a_host_that_is_set_up(self):
+        self.set_up()
+        document = ask("status")
+        self.assertEqual(document["exit"], DONE, document)
+        self.assertEqual([finding["word"] for finding in document["findings"]], [])
+
     def test_a_second_setup_changes_nothing(self):
         self.set_up()
         first = etc()

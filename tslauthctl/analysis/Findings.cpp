@@ -38,6 +38,16 @@ bool NamesModule(std::string const& policy, std::string const& module) {
                        [&](PAMLine const& line) { return BaseName(line.module) == module; });
 }
 
+/// Whether an activation's entry stands in any facility. The policy may ask the same module
+/// otherwise, whichever store is active: that is for the provider to say.
+bool HasEntry(std::string const& policy, SystemConfiguration::PAMEntry const& entry) {
+    auto const lines = ReadPAMMeaning(policy).lines;
+    auto const text = Printed(entry);
+    return std::any_of(lines.begin(), lines.end(), [&](PAMLine const& line) {
+        return line == ReadPAMEntry(line.facility, text);
+    });
+}
+
 bool AsksService(std::string const& text, NSSServices const& sought) {
     auto const meaning = ReadNSSMeaning(text);
     auto const databases = EditedDatabases();
@@ -68,11 +78,12 @@ void AddEntriesLeft(HostFacts const& facts, std::vector<Finding>& findings) {
     for (auto const& each : Unwanted(facts)) {
         auto const module = BaseName(each.pam.module());
         for (auto const& [path, text] : facts.policies) {
-            if (text && NamesModule(*text, module)) {
+            bool const own = path == Paths::PAMPolicy;
+            if (text && (own ? HasEntry(*text, each.pam) : NamesModule(*text, module))) {
                 findings.push_back({"entries-left",
                                     path + " still has entries of '" + module +
                                         "', which the recorded store does not want",
-                                    path == Paths::PAMPolicy ? advice : ""});
+                                    own ? advice : ""});
             }
         }
         auto const service = ReadNSSServices(Printed(each.nss));

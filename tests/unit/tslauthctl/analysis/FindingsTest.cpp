@@ -47,6 +47,19 @@ TEST(FindingsTest, EntriesThatNobodyWantsAreFoundInEveryPolicyAndInTheSwitch) {
     EXPECT_THAT(WordsOf(facts), ElementsAre("entries-left", "entries-left", "entries-left"));
 }
 
+TEST(FindingsTest, WhatThePolicyAsksOfTheModuleWhicheverStoreIsActiveIsNotLeft) {
+    std::string const ownLine = "account required pam_prov.so check_only\n";
+    auto facts = InOrder();
+    facts.policies[policyPath] = ownLine + entry;
+    EXPECT_THAT(WordsOf(facts), IsEmpty());
+    facts.wanted = false;
+    facts.policies[policyPath] = ownLine;
+    facts.nameServices = "passwd: files\n";
+    EXPECT_THAT(WordsOf(facts), IsEmpty());
+    facts.policies[policyPath] = ownLine + entry;
+    EXPECT_THAT(WordsOf(facts), ElementsAre("entries-left"));
+}
+
 TEST(FindingsTest, EntriesOfAnEarlierProviderAreFoundByTheRecord) {
     auto facts = InOrder();
     facts.inserted = {MakeProviderEntries("pam_old.so", {}, "old", {}), *facts.configured};
