@@ -158,6 +158,17 @@ class SetupTest(unittest.TestCase):
         self.assertEqual(document["exit"], DONE, document)
         self.assertEqual([finding["word"] for finding in document["findings"]], [])
 
+    def test_status_passes_over_copies_of_policies(self):
+        self.set_up_and_activate()
+        copy = pathlib.Path("/etc/pam.d/common-auth.pam-old")
+        copy.write_text("auth sufficient pam_winbind.so\n")
+        words = [finding["word"] for finding in ask("status")["findings"]]
+        copy.rename(copy.with_suffix(".in-use"))
+        told = [finding["word"] for finding in ask("status")["findings"]]
+        copy.with_suffix(".in-use").unlink()
+        self.assertNotIn("samba-profile", words)
+        self.assertIn("samba-profile", told)
+
     def test_a_second_setup_changes_nothing(self):
         self.set_up()
         first = etc()

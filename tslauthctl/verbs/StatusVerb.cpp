@@ -15,9 +15,14 @@
 
 #include <tslauth/Paths.h>
 
+#include <base/AsciiText.h>
+
+#include <algorithm>
 #include <filesystem>
+#include <iterator>
 #include <map>
 #include <optional>
+#include <string_view>
 #include <system_error>
 #include <unistd.h>
 
@@ -75,13 +80,24 @@ Agreement DescribeFile(char const* path, bool providerKnown, Parts const& parts,
     return agreement;
 }
 
+/// Whether a file is what pam-auth-update, dpkg or this tool have left of a policy: no service has
+/// such a name.
+bool IsCopy(std::string const& path) {
+    constexpr std::string_view ends[] = {".pam-old",  ".dpkg-old", ".dpkg-dist",
+                                         ".dpkg-new", ".ucf-dist", ".tslauth-orig"};
+    return std::any_of(std::begin(ends), std::end(ends),
+                       [&](std::string_view end) { return base::AsciiText::EndsWith(path, end); });
+}
+
 /// Every policy that a service may have, by its path.
 std::map<std::string, std::optional<std::string>> Policies() {
     std::map<std::string, std::optional<std::string>> policies;
     std::error_code error;
     for (auto const& entry : std::filesystem::directory_iterator(PolicyFolder, error)) {
         auto const path = entry.path().string();
-        policies[path] = HostFileOrNothing(path);
+        if (!IsCopy(path)) {
+            policies[path] = HostFileOrNothing(path);
+        }
     }
     return policies;
 }
