@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <tslauth/HostLock.h>
 
-#include <tslauth/Paths.h>
 #include "SystemFile.h"
 
 #include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
 
 #include <base/Descriptor.h>
 

@@ -761,7 +761,7 @@ TEST_F(ExampleProviderTest, JoinsItsDomainAndRemembersIt) {
     EXPECT_EQ(Domain(), _provider->GetActiveDomain());
     EXPECT_EQ("", _provider->GetMachineAccountDN());
     EXPECT_THAT(_provider->GetTrustedDomains(), IsEmpty());
-    EXPECT_EQ(0, _provider->GetDomainTrustState());
+    EXPECT_EQ(TSLAUTH_PROVIDER_TRUST_NOT_JOINED, _provider->GetDomainTrustState());
     EXPECT_EQ(0, _provider->GetDomainTrustRelationship("example.test"));
 
     Join("Example.Test");
@@ -769,7 +769,7 @@ TEST_F(ExampleProviderTest, JoinsItsDomainAndRemembersIt) {
     EXPECT_EQ(Domain("example.test", "EXAMPLE"), _provider->GetActiveDomain());
     EXPECT_EQ("CN=node01,CN=Computers,DC=example,DC=test", _provider->GetMachineAccountDN());
     EXPECT_THAT(_provider->GetTrustedDomains(), ElementsAre(Domain("example.test", "EXAMPLE")));
-    EXPECT_EQ(1, _provider->GetDomainTrustState());
+    EXPECT_EQ(TSLAUTH_PROVIDER_TRUST_IN_ORDER, _provider->GetDomainTrustState());
     EXPECT_EQ(1, _provider->GetDomainTrustRelationship("EXAMPLE"));
     EXPECT_EQ(0, _provider->GetDomainTrustRelationship("other.test"));
     EXPECT_EQ("host/node01@EXAMPLE.TEST", _provider->GetHostPrincipalForDomain("example.test"));

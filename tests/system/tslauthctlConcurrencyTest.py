@@ -32,6 +32,7 @@ WAITING = b"tslauthctl: waiting for another tslauthctl to finish ...\n"
 class Concurrency(unittest.TestCase):
     def test_activations_never_interleave(self):
         set_up()
+        follow()
         running = [subprocess.Popen([TOOL, "activate", STORES[i % 2]], stdout=subprocess.DEVNULL,
                                     stderr=subprocess.PIPE) for i in range(60)]
         looks = 0
@@ -45,7 +46,6 @@ class Concurrency(unittest.TestCase):
             message = process.communicate()[1].replace(WAITING, b"")
             self.assertEqual((DONE, b""), (process.returncode, message))
         self.assertGreater(looks, 0)
-        follow()
         self.assertEqual(DONE, ask("status")["exit"])
 
     def test_without_the_lock_they_wait_and_say_so(self):
