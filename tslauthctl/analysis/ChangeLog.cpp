@@ -35,6 +35,21 @@ std::string Quoted(std::string const& text) {
     return quoted + "\"";
 }
 
+/// The arguments as they may be shown. Who is used to other tools may have written a password
+/// behind the account's name, as in "--user joiner%secret".
+std::vector<std::string> WithoutPasswords(std::vector<std::string> arguments) {
+    std::string const option = "--user";
+    bool isAccount = false;
+    for (auto& argument : arguments) {
+        bool const both = argument.compare(0, option.size() + 1, option + "=") == 0;
+        if (auto const at = argument.find('%'); (isAccount || both) && at != std::string::npos) {
+            argument.replace(at, std::string::npos, "%...");
+        }
+        isAccount = argument == option;
+    }
+    return arguments;
+}
+
 Caller ThisCaller() {
     Caller caller;
     caller.uid = getuid();
@@ -54,7 +69,7 @@ Caller ThisCaller() {
 std::string LineFor(std::vector<std::string> const& arguments, std::string const& outcome,
                     Caller const& caller) {
     std::string command;
-    for (auto const& argument : arguments) {
+    for (auto const& argument : WithoutPasswords(arguments)) {
         bool const plain = !argument.empty() && argument.find_first_of(" \t'") == std::string::npos;
         command += (command.empty() ? "" : " ") + (plain ? argument : "'" + argument + "'");
     }

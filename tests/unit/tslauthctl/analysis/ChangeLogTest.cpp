@@ -19,5 +19,18 @@ TEST(ChangeLogTest, NothingInAnArgumentPassesForAFieldOrALine) {
               LineFor({"part", "\"\noutcome=done"}, "refused", {0, "", ""}));
 }
 
+TEST(ChangeLogTest, APasswordBehindTheNameOfAnAccountIsNotShown) {
+    for (auto const& account : {std::vector<std::string>{"--user", "joiner%secret"},
+                                std::vector<std::string>{"--user=joiner%secret"}}) {
+        auto arguments = account;
+        arguments.insert(arguments.begin(), "part");
+        auto const line = LineFor(arguments, "done", {0, "", ""});
+        EXPECT_EQ(std::string::npos, line.find("secret")) << line;
+        EXPECT_NE(std::string::npos, line.find("joiner%...")) << line;
+    }
+    EXPECT_NE(std::string::npos,
+              LineFor({"permit", "--force", "a%b"}, "done", {0, "", ""}).find("a%b"));
+}
+
 } // namespace
 } // namespace tessel::tslauthctl::ChangeLog
