@@ -44,6 +44,10 @@ def main_path(lab, host):
     with lab.step("\"Active Directory\" is active") as step:
         step.took(host.tslauthctl("activate", "Active Directory").seconds)
         until("user1 resolves", lambda: host.run("getent", "passwd", USER).code == 0)
+    with lab.step("nobody of the domain is permitted yet: CORP\\user1 is refused"):
+        refused(host, USER, PASSWORD)
+    with lab.step("everybody of the domain is permitted"):
+        host.tslauthctl("permit", "--all")
     with lab.step("CORP\\user1 logs in by ssh with the password, at home") as step:
         result = host.ssh(USER, PASSWORD, command="id -un; pwd; ls -d ~")
         expect_equal(result.code, 0, str(result))

@@ -17,21 +17,6 @@ STOCK_HOST = os.path.join(TREE, "tools/stock-host")
 # Ours, in the order in which a person would name them.
 PACKAGES = ("tslauth", "tslauthctl", "tslauth-provider-winbind", "libtslauth1", "libstrandctl1")
 POLICY = "/etc/pam.d/system-auth-generic"
-# What `tslauthctl setup` does, for a tool that has no such command yet.
-BY_HAND = """
-    mkdir -p /etc/tessel/tslauth
-    echo 'remote-authentication-store = "None"' >/etc/tessel/tslauth/authentication.conf
-    echo 'provider = "winbind"' >/etc/tessel/tslauth/provider.conf
-    echo '+:ALL:ALL' >/etc/tessel/tslauth/access.conf
-    /usr/libexec/tslauth/keep-policy create
-    grep -q check_only /etc/pam.d/system-auth-generic || sed -i '
-        0,/^account/ s/^account/account\\trequired\\tpam_tslauth_winbind.so\\tcheck_only\\n&/
-        0,/^password/ s/^password/password\\tsufficient\\tpam_tslauth_winbind.so\\ttry_first_pass\\n&/
-        ' /etc/pam.d/system-auth-generic
-    pam-auth-update --disable winbind
-    pam-auth-update --enable tslauth tslauth-password
-    tslauthctl prepare --write --accept-loss || [ $? = 7 ]
-    """
 SSH_OPTIONS = ("-o", "StrictHostKeyChecking=no", "-o", "UserKnownHostsFile=/dev/null",
                "-o", "LogLevel=ERROR", "-o", "ConnectTimeout=20", "-o", "NumberOfPasswordPrompts=1")
 
@@ -215,10 +200,7 @@ class StockHost(Node):
 
     def set_up(self):
         """Ready for the first activation."""
-        if "\n  setup " in self.tslauthctl("--help").out:
-            self.tslauthctl("setup", "--provider", "winbind")
-        else:
-            self.shell(BY_HAND)
+        self.tslauthctl("setup", "--provider", "winbind")
 
     def follows(self):
         """The services ask the policy, and Debian's own winbind profile is off."""
