@@ -269,6 +269,7 @@ public:
                 return NSSLosses(is, ReadNSSMeaning(left), Edit::remove, entry, databases);
             };
             AddLossesOnReturn(onReturn, file);
+            AddLossByParameters(file);
         }
         AddCommentNote(was.comments, is.comments, file);
         for (auto const line : was.faultyLines) {
@@ -284,6 +285,16 @@ public:
     }
 
 private:
+    /// Not a byte goes, and yet the service may be the last one that is asked: with
+    /// "[NOTFOUND=return]" no user of the host's own files is found any more, root included.
+    void AddLossByParameters(PlannedFile& file) const {
+        if (file.losses.empty() && !_service.parameters().empty()) {
+            file.losses.push_back("the service '" + _service.module() +
+                                  "' comes with parameters, which decide whether those behind it "
+                                  "are asked for local users");
+        }
+    }
+
     EditForm _form;
     Edit _edit;
     SystemConfiguration::NSSService _service;

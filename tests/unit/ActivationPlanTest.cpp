@@ -17,6 +17,7 @@ using testing::Contains;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
+using testing::SizeIs;
 
 constexpr char local[] = "passwd: files\ngroup: files\nshadow: files\n";
 constexpr char record[] = "remote-authentication-store = \"None\"\n";
@@ -286,6 +287,16 @@ TEST(ActivationPlanTest, AProvidersParametersCostItsNeighboursOnTheWayBack) {
         ElementsAre("group: service 'files' would be lost (when the store is left again)",
                     "passwd: service 'files' would be lost (when the store is left again)",
                     "shadow: service 'files' would be lost (when the store is left again)"));
+}
+
+TEST(ActivationPlanTest, ParametersOfTheServiceAreALossAlsoWhereNoByteGoes) {
+    for (char const* const parameter : {"NOTFOUND=return", "NOTFOUND=continue"}) {
+        auto const entries = MakeProviderEntries("pam_prov.so", {}, "prov", {parameter});
+        auto const plan = ActivationPlan::Activating(entries, {}, EditForm::Lossless);
+        EXPECT_THAT(SwitchLosses(plan, local), SizeIs(1)) << parameter;
+        EXPECT_THAT(SwitchLosses(ActivationPlan::Withdrawing(entries, EditForm::Lossless), local),
+                    IsEmpty());
+    }
 }
 
 TEST(ActivationPlanTest, ParametersThatTheCLibraryDoesNotUnderstandCostTheNeighboursAtOnce) {
