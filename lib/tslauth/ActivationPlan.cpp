@@ -457,6 +457,12 @@ ActivationPlan ActivationPlan::Replacing(std::string const& previous, std::strin
     return plan;
 }
 
+ActivationPlan ActivationPlan::Recording(std::string const& store) {
+    ActivationPlan plan;
+    plan._steps = {boost::make_shared<RecordStep>(store)};
+    return plan;
+}
+
 ActivationPreview ActivationPlan::Preview() const {
     return Preview(HostFile);
 }

@@ -459,6 +459,17 @@ class Provider(Case):
         set_up(provider="truncated")
         self.refused() # by the loader, or because loading ends the child
 
+    def test_the_way_back_to_none_needs_none_that_cannot_be_loaded(self):
+        before = texts()
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+        PROVIDER.write_text('provider = "x/../../../../tmp/y"\n')
+        self.assertEqual(REFUSED, self.unchanged("activate", "None")["exit"])
+        document = ask("activate", "None", "--accept-loss")
+        self.assertEqual((DONE, {str(path) for path in FILES}),
+                         (document["exit"], set(document["changed"])))
+        self.assertEqual(before, texts())
+        self.assertEqual(DONE, ask("activate", "None")["exit"])
+
     def test_a_pipe_in_its_place_is_not_waited_for(self):
         path = pathlib.Path("/usr/libexec/tslauth/libpipe.so")
         os.mkfifo(path)

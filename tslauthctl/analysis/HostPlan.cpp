@@ -54,6 +54,20 @@ ActivationPlan PlanForNone(HostPlan& plan) {
     return steps;
 }
 
+/// The way back from a provider that ends whoever loads it, or that is not to be loaded: nothing
+/// but what is recorded is known of its entries.
+ActivationPlan PlanForNoneWithoutProvider(HostPlan& plan) {
+    ActivationPlan steps;
+    if (RecordedStore() == NoStore) {
+        plan.refusal.reset();
+    } else {
+        steps = ActivationPlan::Recording(NoStore);
+    }
+    plan.insertedMeanwhile = InsertedOnHost();
+    steps.Append(WithdrawalOf(plan.insertedMeanwhile));
+    return steps;
+}
+
 ActivationPlan PlanForActiveDirectory(HostPlan& plan) {
     ActiveDirectoryStore const store(0);
     auto const entries = store.GetProviderEntries();
@@ -76,9 +90,16 @@ ActivationPlan PlanFor(HostPlan& plan) {
 HostPlan MakeHostPlan(std::string const& store) {
     HostPlan plan;
     plan.store = store;
-    CheckProvider();
     try {
-        plan.steps = PlanFor(plan);
+        CheckProvider();
+    } catch (Failure const& e) {
+        if (store != NoStore) {
+            throw;
+        }
+        plan.refusal = e;
+    }
+    try {
+        plan.steps = plan.refusal ? PlanForNoneWithoutProvider(plan) : PlanFor(plan);
         plan.recorded = RecordedStore();
         plan.preview = plan.steps.Preview();
         if (plan.preview.refusal) {

@@ -54,8 +54,9 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         console.Error(*plan.refusal);
         console.ErrorDetail("nothing was changed");
         if (leavesEntries) {
-            console.ErrorDetail("with --accept-loss 'None' is recorded all the same, and the "
-                                "provider's entries stay in the files");
+            console.ErrorDetail(
+                "with --accept-loss 'None' is recorded all the same, and entries of "
+                "the provider may stay in the files");
         }
         AddPrepareHint(plan, console);
         return ExitCode::refused;

@@ -114,6 +114,10 @@ public:
     static ActivationPlan Replacing(std::string const& previous, std::string const& store,
                                     EditForm form = EditForm::Normalised);
 
+    /// Records `store` and does no more: for a host whose recorded store cannot be made any longer,
+    /// since its provider ends whoever loads it. Its entries stay; see `Withdrawing`.
+    static ActivationPlan Recording(std::string const& store);
+
     ActivationPlan(ActivationPlan const& other);
     ActivationPlan& operator=(ActivationPlan const& other);
     ~ActivationPlan();
