@@ -1,5 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """Hosts join with credentials, and users log in through what the library wrote."""
+import json
+
 from lab import LOCAL_PASSWORD, LogIn, PASSWORD, Story, at_once, expect, expect_equal
 
 TITLE = "Joining with credentials, and logging in"
@@ -128,7 +130,11 @@ def is_activated(host):
     switch = host.read("/etc/nsswitch.conf")
     for database in ("passwd", "group", "shadow"):
         expect(f"{database}: tslauth_winbind files\n" in switch, switch)
-    host.tslauthctl("status")
+    # No service of these hosts includes the policy, and status says so.
+    status = json.loads(host.run("tslauthctl", "--json", "status").out)
+    expect_equal([file["state"] for file in status["files"]], ["in-step", "in-step"], "the files")
+    expect_equal({finding["word"] for finding in status["findings"]}, {"services-not-following"},
+                 "what status finds")
 
 
 def resolves(controller, host, domain, user):

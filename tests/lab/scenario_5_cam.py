@@ -34,7 +34,7 @@ def unknown(code):
     return "UnknownException", f"Exception 0x{code:08x}: Unknown exception"
 
 
-NO_CODE, CODE_REFUSED = unknown(2), unknown(5)
+NO_CODE, CODE_REFUSED, JOINED_ALREADY = unknown(2), unknown(5), unknown(2691)
 
 
 # --- the service's side --------------------------------------------------------------------------
@@ -216,9 +216,9 @@ def user_logs_in(lab, host):
 
 
 def code_counts_once(lab, host, code):
-    with lab.step(f"{host.name}: the same code again: code 5, and the host stays joined"):
+    with lab.step(f"{host.name}: the same code again: code 2691, and the host stays joined"):
         give(host, code)
-        library_is_refused(host.library("join-cam", SERVER), CODE_REFUSED)
+        library_is_refused(host.library("join-cam", SERVER), JOINED_ALREADY)
         host.shell("rm $1", CODE)
         host.tslauthctl("info")
 

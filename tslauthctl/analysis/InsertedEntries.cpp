@@ -13,6 +13,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <list>
+#include <system_error>
 
 namespace tessel::tslauthctl {
 
@@ -98,8 +99,17 @@ void RecordInserted(EntriesList const& entries) {
     if (before.value_or("") == text) {
         return;
     }
+    std::filesystem::path const record(InsertedRecord);
     try {
-        std::filesystem::create_directories(std::filesystem::path(InsertedRecord).parent_path());
+        if (text.empty()) {
+            // A host without such entries is as it was before the first.
+            std::filesystem::remove(record);
+            std::error_code inUse; // the folder has other records, too
+            std::filesystem::remove(record.parent_path(), inUse);
+            base::SyncFolderOf(InsertedRecord);
+            return;
+        }
+        std::filesystem::create_directories(record.parent_path());
         base::ReplaceFile(InsertedRecord, text);
     } catch (std::exception const& e) {
         throw Failure(ExitCode::failure,
