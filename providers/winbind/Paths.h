@@ -41,6 +41,9 @@ inline constexpr char Staging[] = "/run/tslauth-winbind.XXXXXX";
 /// like those of files that are on their way to their place.
 inline constexpr char OriginalSuffix[] = ".original";
 
+/// There while winbindd has been told that no controller can be reached; as old as that is.
+inline constexpr char OffLine[] = "/run/tslauth-winbind.offline";
+
 /// Tells the PAM module whether the domain lets a user log in; installed beside the provider.
 inline constexpr char AccountProgram[] = "/usr/libexec/tslauth/winbind-account";
 /// Samba's PAM module, in the folder of the provider's own.

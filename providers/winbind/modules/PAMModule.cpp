@@ -9,10 +9,13 @@
 #include "modules/AccountBounds.h"
 #include "modules/LocalAccounts.h"
 #include "text/AccountAnswer.h"
+#include "text/SambaDomain.h"
 
 #include <algorithm>
 #include <dlfcn.h>
 #include <exception>
+#include <fstream>
+#include <iterator>
 #include <security/pam_ext.h>
 #include <security/pam_modules.h>
 #include <string>
@@ -121,6 +124,21 @@ bool IsAuthenticated(pam_handle_t* handle, std::string const& user) {
            *static_cast<std::string const*>(found) == user;
 }
 
+/// Where users may log in while no controller answers, winbindd has to know that none does.
+void PrepareForPassword(pam_handle_t* handle) {
+    std::ifstream file(Paths::OwnSamba);
+    std::string const text(std::istreambuf_iterator<char>(file), {});
+    if (!LetsInOffLine(text)) {
+        return;
+    }
+    try {
+        (void)ChildProcess::Run({{Paths::AccountProgram, "--reach"}},
+                                Clock::now() + AccountBounds::Program);
+    } catch (Failure const& failure) {
+        pam_syslog(handle, LOG_ERR, "%s", failure.what()); // winbindd notices some time by itself
+    }
+}
+
 AccountAnswer AskDomain(pam_handle_t* handle, std::string const& user) {
     try {
         ChildProcess::Outcome const outcome = ChildProcess::Run(
@@ -190,6 +208,9 @@ int Answer(char const* function, Call call) {
     bool const isAuthentication = function == std::string("pam_sm_authenticate");
     if (call.TakeCheckOnly()) {
         return function == std::string("pam_sm_acct_mgmt") ? CheckAccount(call, user) : PAM_IGNORE;
+    }
+    if (isAuthentication) {
+        PrepareForPassword(call.handle);
     }
     int const result = Forward(function, call);
     if (HasBecomeLocal(call.handle, user)) {

@@ -9,7 +9,7 @@
 #include "host/SystemLog.h"
 #include "questions/Questions.h"
 #include "samba/WinbindClient.h"
-#include "text/SambaSettings.h"
+#include "text/SambaDomain.h"
 
 #include <base/AsciiText.h>
 #include <cstdint>
@@ -87,12 +87,6 @@ bool IsSilence(ActiveDirectoryClientErrorCode code) {
            code == TSLAUTH_PROVIDER_CONNECTION_REFUSED;
 }
 
-/// As the join has set winbindd up, which lets users in on the same condition.
-bool LetsInOffLine(Host const& host) {
-    SambaSettings const settings(ReadHostFile(host.At(Paths::OwnSamba)).value_or(""));
-    return settings.Value("winbind offline logon") == "yes";
-}
-
 AccountAnswer Ask(Host const& host, std::string const& user, Clock::time_point deadline) {
     auto const membership = Membership::Read(host);
     if (!membership) {
@@ -136,8 +130,11 @@ AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
         return Ask(host, user, deadline);
     } catch (Failure const& failure) {
         LogWarning("may '" + user + "' log in: " + failure.what());
-        return IsSilence(failure.Code()) && LetsInOffLine(host) ? AccountAnswer::OffLine
-                                                                : AccountAnswer::NoAnswer;
+        // winbindd lets users in on the same condition.
+        return IsSilence(failure.Code()) &&
+                       LetsInOffLine(ReadHostFile(host.At(Paths::OwnSamba)).value_or(""))
+                   ? AccountAnswer::OffLine
+                   : AccountAnswer::NoAnswer;
     } catch (std::exception const& failure) {
         LogWarning("may '" + user + "' log in: " + failure.what());
         return AccountAnswer::NoAnswer;

@@ -206,6 +206,10 @@ std::optional<SambaDomain> ReadSambaDomain(std::string_view text) {
     return domain;
 }
 
+bool LetsInOffLine(std::string_view text) {
+    return SambaSettings(text).Value("winbind offline logon") == "yes";
+}
+
 std::string WithPreferredControllers(std::string_view text,
                                      std::vector<std::string> const& controllers) {
     std::string setting;

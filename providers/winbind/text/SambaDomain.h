@@ -43,6 +43,9 @@ std::vector<std::string> StagingDirectories(std::string const& directory);
 /// Reads the provider's own file back. Empty where it lacks the realm or the workgroup.
 std::optional<SambaDomain> ReadSambaDomain(std::string_view text);
 
+/// Whether the provider's own file lets users log in while no controller answers.
+bool LetsInOffLine(std::string_view text);
+
 /// The provider's own file with other preferred controllers and nothing else changed, so that users
 /// keep their numbers whatever the administrator has changed since the join.
 /// @throws Failure as above

@@ -301,6 +301,9 @@ private:
                         (std::filesystem::exists(path) ? Contents(path) : "") + "keys of node");
             return {0, 0, false, ""};
         }
+        if (Holds(command, "smbcontrol ")) {
+            return {0, 0, false, ""};
+        }
         if (Holds(command, " ads dns register ")) {
             return {0, 0, false, "Successfully registered hostname with DNS\n"};
         }
