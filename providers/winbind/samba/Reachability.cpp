@@ -64,6 +64,7 @@ bool IsMade(int connection) {
 /// Whether one of them is made by the deadline.
 bool IsOneMade(std::vector<base::Descriptor> const& connections, Clock::time_point deadline) {
     std::vector<pollfd> watched;
+    watched.reserve(connections.size());
     for (base::Descriptor const& connection : connections) {
         watched.push_back({connection.Get(), POLLOUT, 0});
     }
