@@ -29,6 +29,9 @@ ACTIVATION = {
     "/etc/pam.d/system-auth-generic": "changed",
     "/etc/nsswitch.conf": "changed",
     "/etc/tessel/tslauth/authentication.conf": "changed",
+    # What tslauthctl has put into the files, so that it can take that out again.
+    "/var/lib/tslauth": "new",
+    "/var/lib/tslauth/inserted": "new",
 }
 # The entry of the management address stays in /etc/hosts.
 KEPT_BY_US = {

@@ -22,6 +22,7 @@ template <typename Value> std::string Printed(Value const& value) {
 
 std::vector<Part> UnknownParts(std::vector<std::string> const& names) {
     std::vector<Part> parts;
+    parts.reserve(names.size());
     for (auto const& name : names) {
         parts.push_back({name, Agreement::unknown});
     }

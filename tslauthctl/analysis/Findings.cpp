@@ -80,10 +80,10 @@ void AddEntriesLeft(HostFacts const& facts, std::vector<Finding>& findings) {
         for (auto const& [path, text] : facts.policies) {
             bool const own = path == Paths::PAMPolicy;
             if (text && (own ? HasEntry(*text, each.pam) : NamesModule(*text, module))) {
-                findings.push_back({"entries-left",
-                                    path + " still has entries of '" + module +
-                                        "', which the recorded store does not want",
-                                    own ? advice : ""});
+                auto found = path;
+                found += " still has entries of '" + module;
+                found += "', which the recorded store does not want";
+                findings.push_back({"entries-left", found, own ? advice : ""});
             }
         }
         auto const service = ReadNSSServices(Printed(each.nss));

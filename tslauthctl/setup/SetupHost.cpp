@@ -157,6 +157,7 @@ std::string RunProgram(std::vector<std::string> arguments) {
     std::string settings[] = {"PATH=/usr/sbin:/usr/bin:/sbin:/bin", "LC_ALL=C.UTF-8", "HOME=/root",
                               "DEBIAN_FRONTEND=noninteractive"};
     std::vector<char*> environment;
+    environment.reserve(std::size(settings) + 1);
     for (auto& setting : settings) {
         environment.push_back(setting.data());
     }

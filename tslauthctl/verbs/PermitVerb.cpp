@@ -44,7 +44,7 @@ Subject Typed(std::string const& name) {
 
 Subject Resolved(std::string const& typed, AccessArguments const& arguments, Limit limit,
                  Console& console) {
-    auto const subject = Typed(typed);
+    auto subject = Typed(typed);
     auto const known = Ask(console, "the name service to know '" + subject.name + "'", limit,
                            [name = subject.name] { return LookUpName(name); });
     if (!subject.isGroup && known.user) {
@@ -182,7 +182,10 @@ ExitCode RunListAccess(Console& console) {
                                      {"exceptions", exceptions},
                                      {"origins", rule.origins}});
         auto const from = rule.origins == "ALL" ? std::string() : " from " + rule.origins;
-        console.Line((rule.permits ? "permitted  " : "denied     ") + text + from);
+        std::string line = rule.permits ? "permitted  " : "denied     ";
+        line += text;
+        line += from;
+        console.Line(line);
     }
     document["by_default"] = rules.PermitByDefault();
     document["faulty_lines"] = rules.faultyLines;
