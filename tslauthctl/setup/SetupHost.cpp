@@ -150,6 +150,7 @@ std::string RunProgram(std::vector<std::string> arguments) {
     posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
     posix_spawn_file_actions_adddup2(&actions, input.Get(), STDERR_FILENO);
     std::vector<char*> words;
+    words.reserve(arguments.size() + 1);
     for (auto& argument : arguments) {
         words.push_back(argument.data());
     }
