@@ -20,6 +20,7 @@ STATE = pathlib.Path("/var/lib/tslauth/setup")
 LINK = pathlib.Path("/lib/security/lib/security")
 PROFILES = pathlib.Path("/usr/share/pam-configs")
 SERVICE = "setup-test"
+DIRECT = "setup-test-direct"
 USER = "CORP\\Ann Lee"
 GROUP = "CORP\\domain users"
 
@@ -82,8 +83,6 @@ def populate():
     pathlib.Path("/etc/pam.d", SERVICE).write_text(
         "@include common-auth\n@include common-account\n@include common-password\n"
         "session required pam_permit.so\n@include common-session\n")
-    pathlib.Path("/etc/pam.d/setup-test-direct").write_text(
-        "auth include system-auth-generic\naccount include system-auth-generic\n")
     subprocess.run(["useradd", "--create-home", "lena"], check=True)
     subprocess.run(["chpasswd"], input="lena:local secret\n", text=True, check=True)
     extra = pathlib.Path("/var/lib/extrausers")
@@ -139,6 +138,21 @@ class SetupTest(unittest.TestCase):
     def set_up_and_activate(self):
         self.set_up()
         self.assertEqual(ask("activate", AD)["exit"], DONE)
+
+    def include_directly(self):
+        """A service of this host that includes the policy by itself."""
+        path = pathlib.Path("/etc/pam.d", DIRECT)
+        path.write_text(
+            "auth include system-auth-generic\naccount include system-auth-generic\n")
+        self.addCleanup(path.unlink, missing_ok=True)
+        return path
+
+    def local_users_log_in(self, *services):
+        for service in services:
+            self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", password="local secret",
+                                   service=service), service)
+            self.assertFalse(log_in("lena", "authenticate", password="wrong", service=service))
+            self.assertTrue(log_in("root", "acct_mgmt", service=service), service)
 
     def test_the_plan_shows_what_setup_does_and_changes_nothing(self):
         plan = ask("plan", "setup", "--provider", "winbind")
@@ -210,6 +224,52 @@ class SetupTest(unittest.TestCase):
         del after[NSS], self.before[NSS]
         self.assertEqual(after, self.before)
 
+    def test_the_policy_stays_while_a_service_includes_it(self):
+        self.set_up()
+        direct = self.include_directly()
+        planned = {file["path"]: file["outcome"] for file in ask("plan", "unsetup")["files"]}
+        self.assertEqual(planned[str(PAM)], "in-use")
+        self.assertEqual(ask("activate", AD)["exit"], DONE)
+        said = run("unsetup")
+        self.assertEqual(said.returncode, LOSS)
+        self.assertIn(f"included by '{direct}'", (said.stdout + said.stderr).decode())
+        self.assertEqual(PAM.read_text(), (TREE / "etc/system-auth-generic").read_text())
+        self.local_users_log_in(DIRECT)
+        self.assertFalse(log_in(USER, "acct_mgmt", service=DIRECT))
+        direct.rename(direct.with_suffix(".dpkg-old"))
+        self.addCleanup(direct.with_suffix(".dpkg-old").unlink)
+        self.assertEqual(ask("unsetup")["exit"], DONE)
+        self.assertFalse(PAM.exists())
+        self.assertFalse(STATE.exists())
+
+    def test_the_policy_stays_while_pam_auth_update_leaves_edited_files_alone(self):
+        self.set_up()
+        account = pathlib.Path("/etc/pam.d/common-account")
+        text = account.read_text()
+        account.write_text(text.replace("# here are the per-package modules", "# here were"))
+        document = ask("unsetup")
+        self.assertEqual(document["exit"], LOSS)
+        outcomes = {file["path"]: file["outcome"] for file in document["files"]}
+        self.assertEqual(outcomes[str(PAM)], "in-use")
+        self.assertEqual(outcomes[str(account)], "changed-since")
+        self.assertIn("system-auth-generic", account.read_text())
+        self.assertTrue(log_in("lena", "acct_mgmt"))
+        self.assertTrue(log_in("root", "acct_mgmt"))
+        self.assertFalse(log_in(USER, "acct_mgmt"))
+
+    def test_where_none_would_lose_something_nothing_is_unset(self):
+        self.set_up_and_activate()
+        first = "auth\t[success=1"
+        # To the denial, over the provider's entry.
+        jump = "auth\t[success=4 default=ignore]\tpam_debug.so\n"
+        PAM.write_text(PAM.read_text().replace(first, jump + first, 1))
+        before = etc()
+        self.assertEqual(ask("activate", "None")["exit"], LOSS)
+        self.assertEqual(ask("unsetup")["exit"], REFUSED)
+        self.assertEqual(etc(), before)
+        self.assertTrue(STATE.exists())
+        self.assertEqual(ask("activate", "None", "--accept-loss")["exit"], DONE)
+
     def test_local_users_log_in_as_before_and_are_never_asked_about(self):
         for prepare in (self.set_up, lambda: ask("activate", AD)):
             prepare()
@@ -217,19 +277,18 @@ class SetupTest(unittest.TestCase):
                                    password="local secret"))
             self.assertFalse(log_in("lena", "authenticate", password="wrong"))
             self.assertTrue(log_in("root", "acct_mgmt"))
-        for service in (SERVICE, "setup-test-direct"):
-            self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", password="local secret",
-                                   service=service))
-            self.assertFalse(log_in("lena", "authenticate", password="wrong", service=service))
+        self.include_directly()
+        self.local_users_log_in(SERVICE, DIRECT)
         self.assertFalse(pathlib.Path("/run/asked").exists())
 
     def test_without_the_providers_module_local_users_log_in_and_nobody_of_the_domain(self):
         self.set_up_and_activate()
         self.assertEqual(ask("permit", USER)["exit"], DONE)
+        self.include_directly()
         module = next(pathlib.Path("/usr/lib").glob("*/security/pam_tslauth_winbind.so"))
         away = module.rename(module.with_suffix(".away"))
         try:
-            for service in (SERVICE, "setup-test-direct"):
+            for service in (SERVICE, DIRECT):
                 self.assertTrue(log_in("root", "acct_mgmt", service=service), service)
                 self.assertFalse(log_in(USER, "acct_mgmt", service=service), service)
         finally:

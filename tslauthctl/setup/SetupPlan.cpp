@@ -257,6 +257,16 @@ std::string PolicyWith(std::vector<std::string> const& lines, std::string_view p
     return out;
 }
 
+std::vector<std::string> FilesThatFollow(PolicyTexts const& policies) {
+    std::vector<std::string> files;
+    for (auto const& [path, text] : policies) {
+        if (text && Follows(*text)) {
+            files.push_back(path);
+        }
+    }
+    return files;
+}
+
 std::vector<std::string>
 FilesThatDoNotFollow(std::map<std::string, std::optional<std::string>> const& texts) {
     std::vector<std::string> others;

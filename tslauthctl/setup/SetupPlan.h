@@ -2,6 +2,8 @@
 #ifndef TSLAUTHCTL_SETUPPLAN_H
 #define TSLAUTHCTL_SETUPPLAN_H
 
+#include "analysis/Policies.h"
+
 #include <meaning/PAMMeaning.h>
 
 #include <map>
@@ -88,6 +90,9 @@ bool AsksAccessRules(meaning::PAMMeaning const& policy);
 
 /// The default policy with a provider's lines in it.
 std::string PolicyWith(std::vector<std::string> const& lines, std::string_view policy);
+
+/// The paths of those of `policies` that include the policy, each in so many words.
+std::vector<std::string> FilesThatFollow(PolicyTexts const& policies);
 
 /// The kinds of services that do not follow the policy, by the files that they include: the names
 /// of those of `texts` that do not lead to it.

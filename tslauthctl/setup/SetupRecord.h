@@ -51,7 +51,9 @@ enum class UndoKind {
     /// It is as it was set up, and was not there before.
     remove,
     /// It was changed since, and stays.
-    changedSince
+    changedSince,
+    /// It was not there before, and stays for who still goes by it.
+    inUse
 };
 
 struct FileUndo {

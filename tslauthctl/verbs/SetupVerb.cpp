@@ -101,7 +101,7 @@ SetupRecord RecordFor(SetupPlan const& plan, SetupFacts const& facts) {
 /// Runs pam-auth-update and remembers what it wrote.
 void LeadServicesToPolicy(SetupPlan const& plan, SetupRecord& record) {
     SwitchProfiles(plan.profilesOn, plan.profilesOff);
-    std::map<std::string, std::optional<std::string>> texts;
+    PolicyTexts texts;
     for (auto const* const path : Paths::ServicePolicies) {
         texts[path] = TextOnHost(path);
         if (texts[path]) {
@@ -174,6 +174,8 @@ char const* Word(UndoKind kind) {
         return "restored";
     case UndoKind::remove:
         return "removed";
+    case UndoKind::inUse:
+        return "in-use";
     case UndoKind::changedSince:
         break;
     }
@@ -200,10 +202,43 @@ bool IsServicePolicy(std::string const& path) {
            std::end(Paths::ServicePolicies);
 }
 
+/// Has the policy stay where it was to be removed and somebody goes by it: libpam refuses everybody
+/// who reaches an include of a missing file.
+/// @param followers the files that include the policy
+void KeepPolicyFor(std::vector<std::string> const& followers, Undoing& undoing, Console& console) {
+    for (auto& undo : undoing.files) {
+        if (undo.path == Paths::PAMPolicy && undo.kind == UndoKind::remove && !followers.empty()) {
+            undo.kind = UndoKind::inUse;
+            console.Warning(undo.path + ": stays as the default one, which lets in the users of " +
+                            "this host alone, for it is included by " + Listed(followers));
+        }
+    }
+}
+
+/// Those that pam-auth-update will not have led elsewhere before the policy would be removed.
+std::vector<std::string> LastingFollowers(SetupRecord const& record) {
+    auto files = FilesThatFollow(PoliciesOnHost());
+    if (!record.profilesOn.empty()) {
+        files.erase(std::remove_if(files.begin(), files.end(), IsServicePolicy), files.end());
+    }
+    return files;
+}
+
+/// Takes out of the policy what the provider has asked for. It can be removed later, still.
+void PutDefaultPolicy() {
+    if (auto const text = TextOnHost(Paths::DefaultPolicy)) {
+        PutOnHost(Paths::PAMPolicy, *text);
+        RecordChange(Paths::PAMPolicy, *text);
+    }
+}
+
 void Undo(RecordedFile const& file, FileUndo const& undo) {
     switch (undo.kind) {
     case UndoKind::asBefore:
     case UndoKind::changedSince:
+        break;
+    case UndoKind::inUse:
+        PutDefaultPolicy();
         break;
     case UndoKind::restore:
         PutOnHost(file.path, *file.before);
@@ -231,9 +266,28 @@ void TakeServicesBack(SetupRecord const& record, Undoing& undoing) {
     }
 }
 
-bool AnyChangedSince(std::vector<FileUndo> const& files) {
+bool Any(UndoKind kind, std::vector<FileUndo> const& files) {
     return std::any_of(files.begin(), files.end(),
-                       [](FileUndo const& file) { return file.kind == UndoKind::changedSince; });
+                       [&](FileUndo const& file) { return file.kind == kind; });
+}
+
+/// How far the host has become what it was.
+ExitCode Conclude(std::vector<FileUndo> const& files, Console& console) {
+    bool const changedSince = Any(UndoKind::changedSince, files);
+    bool const inUse = Any(UndoKind::inUse, files);
+    if (changedSince) {
+        console.Line(std::string("What they were before is kept below ") + Paths::SetupRecord +
+                     "/before.");
+    }
+    if (inUse) {
+        console.Line("Once nothing includes the policy, another 'tslauthctl unsetup' removes it.");
+    }
+    if (changedSince || inUse) {
+        return ExitCode::loss;
+    }
+    RemoveSetupRecord();
+    console.Line("The host is as it was before it was set up.");
+    return ExitCode::done;
 }
 
 bool IsNoneActive() {
@@ -290,10 +344,12 @@ ExitCode RunPlanUnsetup(Console& console) {
         console.Line(notSetUp);
         return ExitCode::done;
     }
-    auto const undoing = PlanUndoing(*record);
+    auto undoing = PlanUndoing(*record);
+    KeepPolicyFor(LastingFollowers(*record), undoing, console);
     Describe(undoing.files, console);
     for (std::size_t i = 0; i < undoing.files.size(); ++i) {
-        if (undoing.files[i].kind != UndoKind::changedSince) {
+        if (undoing.files[i].kind != UndoKind::changedSince &&
+            undoing.files[i].kind != UndoKind::inUse) {
             console.Diff(UnifiedDiff(undoing.files[i].path,
                                      undoing.current[i].value_or(std::string()),
                                      record->files[i].before.value_or(std::string())));
@@ -307,7 +363,8 @@ ExitCode RunUnsetup(Console& console) {
     if (!IsNoneActive()) {
         auto const left = RunActivate(NoStore, false, console);
         if (left != ExitCode::done) {
-            return left;
+            // A loss of this command's own is that something has stayed.
+            return left == ExitCode::loss ? ExitCode::refused : left;
         }
     }
     HostChange const change(console);
@@ -323,6 +380,7 @@ ExitCode RunUnsetup(Console& console) {
     auto undoing = PlanUndoing(*record);
     // First of all, so that no service ever includes a policy that is gone.
     TakeServicesBack(*record, undoing);
+    KeepPolicyFor(FilesThatFollow(PoliciesOnHost()), undoing, console);
     for (std::size_t i = record->files.size(); i > 0; --i) {
         Undo(record->files[i - 1], undoing.files[i - 1]);
     }
@@ -333,14 +391,7 @@ ExitCode RunUnsetup(Console& console) {
         RemoveEmptyFolder(*folder);
     }
     Describe(undoing.files, console);
-    if (AnyChangedSince(undoing.files)) {
-        console.Line(std::string("What they were before is kept below ") + Paths::SetupRecord +
-                     "/before.");
-        return ExitCode::loss;
-    }
-    RemoveSetupRecord();
-    console.Line("The host is as it was before it was set up.");
-    return ExitCode::done;
+    return Conclude(undoing.files, console);
 }
 
 } // namespace tessel::tslauthctl

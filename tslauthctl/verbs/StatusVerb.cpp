@@ -5,6 +5,7 @@
 #include "analysis/HostFile.h"
 #include "analysis/JoinedDomain.h"
 #include "analysis/KnownStores.h"
+#include "analysis/Policies.h"
 #include "analysis/ProviderCheck.h"
 #include "analysis/ProviderOnHost.h"
 #include "verbs/Verbs.h"
@@ -15,15 +16,7 @@
 
 #include <tslauth/Paths.h>
 
-#include <base/AsciiText.h>
-
-#include <algorithm>
-#include <filesystem>
-#include <iterator>
-#include <map>
 #include <optional>
-#include <string_view>
-#include <system_error>
 #include <unistd.h>
 
 namespace tessel::tslauthctl {
@@ -31,8 +24,6 @@ namespace tessel::tslauthctl {
 namespace {
 
 using namespace authentication;
-
-constexpr char PolicyFolder[] = "/etc/pam.d";
 
 /// For people, where the JSON word is terse.
 std::string Text(Agreement agreement) {
@@ -78,28 +69,6 @@ Agreement DescribeFile(char const* path, bool providerKnown, Parts const& parts,
     console.Document()["files"].push_back(
         {{"path", path}, {"state", Word(agreement)}, {"parts", described}, {"error", error}});
     return agreement;
-}
-
-/// Whether a file is what pam-auth-update, dpkg or this tool have left of a policy: no service has
-/// such a name.
-bool IsCopy(std::string const& path) {
-    constexpr std::string_view ends[] = {".pam-old",  ".dpkg-old", ".dpkg-dist",
-                                         ".dpkg-new", ".ucf-dist", ".tslauth-orig"};
-    return std::any_of(std::begin(ends), std::end(ends),
-                       [&](std::string_view end) { return base::AsciiText::EndsWith(path, end); });
-}
-
-/// Every policy that a service may have, by its path.
-std::map<std::string, std::optional<std::string>> Policies() {
-    std::map<std::string, std::optional<std::string>> policies;
-    std::error_code error;
-    for (auto const& entry : std::filesystem::directory_iterator(PolicyFolder, error)) {
-        auto const path = entry.path().string();
-        if (!IsCopy(path)) {
-            policies[path] = HostFileOrNothing(path);
-        }
-    }
-    return policies;
 }
 
 /// Asks the provider what it takes a while to tell.
@@ -210,7 +179,7 @@ ExitCode RunStatus(StatusArguments const& arguments, Console& console) {
     facts.root = geteuid() == 0;
     facts.configured = entries;
     facts.inserted = InsertedOnHost();
-    facts.policies = Policies();
+    facts.policies = PoliciesOnHost();
     facts.nameServices = HostFileOrNothing(Paths::NSSConfiguration);
     facts.missingModules = warnings;
     if (wanted && entries) {

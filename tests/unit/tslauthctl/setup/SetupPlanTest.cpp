@@ -124,6 +124,17 @@ TEST(SetupPlanTest, AServicePolicyThatDoesNotFollowIsNamed) {
     EXPECT_THAT(MakeSetupPlan(facts).profilesOn, ElementsAre("tslauth"));
 }
 
+TEST(SetupPlanTest, WhatIncludesThePolicyInAnyWayIsNamed) {
+    PolicyTexts const policies = {{"/a", "@include system-auth-generic\n"},
+                                  {"/b", "auth substack system-auth-generic\n"},
+                                  {"/c", "-auth [success=1] pam_a.so\nauth include \\\n"
+                                         " system-auth-generic\n"},
+                                  {"/d", "# @include system-auth-generic\n"},
+                                  {"/e", "auth required system-auth-generic\n"},
+                                  {"/f", std::nullopt}};
+    EXPECT_THAT(FilesThatFollow(policies), ElementsAre("/a", "/b", "/c"));
+}
+
 TEST(SetupPlanTest, WithoutAProfileTheServicesAreLeftToTheAdministrator) {
     auto facts = StockHost();
     facts.profiles.clear();
