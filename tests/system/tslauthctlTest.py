@@ -247,12 +247,28 @@ class Activate(Case):
 
     def test_none_is_not_recorded_over_entries_that_would_stay(self):
         ask("activate", AD)
+        inserted = pathlib.Path("/var/lib/tslauth/inserted")
+        inserted.unlink()
         PROVIDER.write_text('provider = "gone"\n')
         self.assertEqual(REFUSED, self.unchanged("activate", "None")["exit"])
         document = ask("activate", "None", "--accept-loss")
-        self.assertEqual(REFUSED, document["exit"])
+        self.assertEqual(DONE, document["exit"])
         self.assertEqual([str(RECORD)], document["changed"])
         self.assertIn("None", RECORD.read_text())
+
+    def test_an_active_store_is_told_where_its_entries_cannot_be_recorded(self):
+        ask("activate", AD)
+        folder = pathlib.Path("/var/lib/tslauth")
+        subprocess.run(["mount", "--bind", folder, folder], check=True)
+        subprocess.run(["mount", "-o", "remount,bind,ro", folder], check=True)
+        try:
+            document = ask("activate", "None")
+        finally:
+            subprocess.run(["umount", folder], check=True)
+        self.assertEqual(FAILURE, document["exit"])
+        self.assertIn("'None' is active, but: ", document["error"]["message"])
+        self.assertEqual({str(path) for path in FILES}, set(document["changed"]))
+        self.assertEqual(DONE, ask("activate", "None")["exit"])
 
     def test_a_failure_in_the_middle_names_what_was_changed(self):
         # The folder of the record takes no new file; those of the others do.
@@ -461,14 +477,16 @@ class Provider(Case):
 
     def test_the_way_back_to_none_needs_none_that_cannot_be_loaded(self):
         before = texts()
-        self.assertEqual(DONE, ask("activate", AD)["exit"])
-        PROVIDER.write_text('provider = "x/../../../../tmp/y"\n')
-        self.assertEqual(REFUSED, self.unchanged("activate", "None")["exit"])
-        document = ask("activate", "None", "--accept-loss")
-        self.assertEqual((DONE, {str(path) for path in FILES}),
-                         (document["exit"], set(document["changed"])))
-        self.assertEqual(before, texts())
-        self.assertEqual(DONE, ask("activate", "None")["exit"])
+        for name in ("x/../../../../tmp/y", "gone"):
+            set_up()
+            self.assertEqual(DONE, ask("activate", AD)["exit"])
+            PROVIDER.write_text(f'provider = "{name}"\n')
+            self.assertEqual(REFUSED, self.unchanged("activate", "None")["exit"])
+            document = ask("activate", "None", "--accept-loss")
+            self.assertEqual((DONE, {str(path) for path in FILES}),
+                             (document["exit"], set(document["changed"])))
+            self.assertEqual(before, texts())
+            self.assertEqual(DONE, ask("activate", "None")["exit"])
 
     def test_a_pipe_in_its_place_is_not_waited_for(self):
         path = pathlib.Path("/usr/libexec/tslauth/libpipe.so")

@@ -29,32 +29,7 @@ ActivationPlan WithdrawalOf(EntriesList const& entries) {
     return plan;
 }
 
-/// The entries of the configured provider, if it can be loaded.
-EntriesList EntriesOfConfigured() {
-    try {
-        return {ActiveDirectoryStore(0).GetProviderEntries()};
-    } catch (std::exception const&) {
-        return {};
-    }
-}
-
-ActivationPlan PlanForNone(HostPlan& plan) {
-    auto steps = NoRemoteAuthenticationStore().GetActivationPlan(EditForm::Lossless);
-    bool const withdrawsConfigured = RecordedStore() == ActiveDirectory;
-    auto const configured = EntriesOfConfigured();
-    auto left = plan.insertedMeanwhile = InsertedOnHost();
-    for (auto const& each : configured) {
-        left = Without(left, each);
-        if (!withdrawsConfigured) {
-            // "None" was recorded by somebody who failed, or did, no more.
-            left.push_back(each);
-        }
-    }
-    steps.Append(WithdrawalOf(left));
-    return steps;
-}
-
-/// The way back from a provider that ends whoever loads it, or that is not to be loaded: nothing
+/// The way back from a provider that is gone, ends whoever loads it, or is not to be loaded: nothing
 /// but what is recorded is known of its entries.
 ActivationPlan PlanForNoneWithoutProvider(HostPlan& plan) {
     ActivationPlan steps;
@@ -65,6 +40,30 @@ ActivationPlan PlanForNoneWithoutProvider(HostPlan& plan) {
     }
     plan.insertedMeanwhile = InsertedOnHost();
     steps.Append(WithdrawalOf(plan.insertedMeanwhile));
+    return steps;
+}
+
+ActivationPlan PlanForNone(HostPlan& plan) {
+    auto steps = NoRemoteAuthenticationStore().GetActivationPlan(EditForm::Lossless);
+    bool const withdrawsConfigured = RecordedStore() == ActiveDirectory;
+    EntriesList configured;
+    try {
+        configured = {ActiveDirectoryStore(0).GetProviderEntries()};
+    } catch (std::exception const& e) {
+        if (withdrawsConfigured) {
+            plan.refusal = Refused(e);
+            return PlanForNoneWithoutProvider(plan);
+        }
+    }
+    auto left = plan.insertedMeanwhile = InsertedOnHost();
+    for (auto const& each : configured) {
+        left = Without(left, each);
+        if (!withdrawsConfigured) {
+            // "None" was recorded by somebody who failed, or did, no more.
+            left.push_back(each);
+        }
+    }
+    steps.Append(WithdrawalOf(left));
     return steps;
 }
 

@@ -25,6 +25,17 @@ std::vector<std::string> ChangedFiles(HostPlan const& plan) {
     return changed;
 }
 
+/// Forgets what has been taken out. That the record names too much harms nothing.
+ExitCode FinishRecord(HostPlan const& plan, Console& console) {
+    try {
+        RecordInserted(plan.insertedAfterwards);
+        return ExitCode::done;
+    } catch (Failure const& e) {
+        console.Error(Failure(e.Code(), "'" + plan.store + "' is active, but: " + e.what()));
+        return e.Code();
+    }
+}
+
 } // namespace
 
 ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console) {
@@ -76,7 +87,6 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
     RecordInserted(plan.insertedMeanwhile);
     try {
         plan.steps.Execute();
-        RecordInserted(plan.insertedAfterwards);
     } catch (std::exception const& e) {
         console.Error(Refused(e));
         auto const changed = ChangedFiles(plan);
@@ -104,7 +114,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
                  (changed.empty() ? "nothing had to be changed"
                                   : base::AsciiText::Counted(changed.size(), "file") + " changed") +
                  ".");
-    return ExitCode::done;
+    return FinishRecord(plan, console);
 }
 
 } // namespace tessel::tslauthctl
