@@ -11,6 +11,8 @@ def refused(host, user, password=None, key=None):
     """What ssh says to somebody who must not get in."""
     result = host.ssh(user, password, key)
     expect(result.code == 255, f"{user} was let in: {result}")
+    expect("Permission denied" in result.err or "Connection closed" in result.err,
+           f"{user} was not refused, but never asked: {result}")
     return result.err
 
 
