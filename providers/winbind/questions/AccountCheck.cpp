@@ -126,17 +126,22 @@ AccountAnswer StateOfAccount(DirectoryEntry const& entry,
 
 AccountAnswer AskAboutAccount(Host const& host, std::string const& user,
                               Clock::time_point deadline) {
+    auto const warn = [&](std::exception const& failure) {
+        LogWarning("may '" + user + "' log in: " + failure.what());
+    };
     try {
-        return Ask(host, user, deadline);
-    } catch (Failure const& failure) {
-        LogWarning("may '" + user + "' log in: " + failure.what());
-        // winbindd lets users in on the same condition.
-        return IsSilence(failure.Code()) &&
-                       LetsInOffLine(ReadHostFile(host.At(Paths::OwnSamba)).value_or(""))
-                   ? AccountAnswer::OffLine
-                   : AccountAnswer::NoAnswer;
+        try {
+            return Ask(host, user, deadline);
+        } catch (Failure const& failure) {
+            warn(failure);
+            // winbindd lets users in on the same condition.
+            return IsSilence(failure.Code()) &&
+                           LetsInOffLine(ReadHostFile(host.At(Paths::OwnSamba)).value_or(""))
+                       ? AccountAnswer::OffLine
+                       : AccountAnswer::NoAnswer;
+        }
     } catch (std::exception const& failure) {
-        LogWarning("may '" + user + "' log in: " + failure.what());
+        warn(failure);
         return AccountAnswer::NoAnswer;
     }
 }

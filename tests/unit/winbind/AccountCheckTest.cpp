@@ -1,8 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "questions/AccountCheck.h"
+#include "PlayedHost.h"
+#include "PlayedWbclient.h"
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <string>
 
 using namespace tessel::winbind;
@@ -24,7 +27,40 @@ AccountAnswer StateOf(std::string const& control, std::string const& computed,
                           now);
 }
 
+/// A joined host that lets users in off line, and whose winbindd reaches no controller.
+void PlayOffLine(PlayedHost const& host) {
+    host.Write(Paths::OwnSamba, "[global]\n\tworkgroup = CORP\n\trealm = CORP.EXAMPLE\n"
+                                "\tnetbios name = NODE\n\twinbind offline logon = yes\n");
+    host.Write(Paths::Samba, "[global]\n\tinclude = /etc/samba/tslauth.conf\n");
+    PlayedWinbindd::Here().account = [] { return WBC_ERR_WINBIND_NOT_AVAILABLE; };
+}
+
+AccountAnswer AnswerOf(PlayedHost const& host) {
+    return AskAboutAccount(host, "CORP\\user1", Clock::now() + 10s);
+}
+
 } // namespace
+
+TEST(AccountCheckTest, WithoutAControllerTheAdministratorSaysWhatFollows) {
+    PlayedHost const host;
+    PlayOffLine(host);
+    EXPECT_EQ(AccountAnswer::OffLine, AnswerOf(host));
+    std::string const lets = "winbind offline logon = yes";
+    std::string text = host.Read(Paths::OwnSamba);
+    host.Write(Paths::OwnSamba, text.replace(text.find(lets), lets.size(), ""));
+    EXPECT_EQ(AccountAnswer::NoAnswer, AnswerOf(host));
+}
+
+TEST(AccountCheckTest, WhereItCannotBeReadWhatFollowsThereIsNoAnswer) {
+    PlayedHost const host;
+    PlayOffLine(host);
+    PlayedWinbindd::Here().account = [&] {
+        std::filesystem::remove(host.At(Paths::OwnSamba));
+        std::filesystem::create_directory(host.At(Paths::OwnSamba));
+        return WBC_ERR_WINBIND_NOT_AVAILABLE;
+    };
+    EXPECT_EQ(AccountAnswer::NoAnswer, AnswerOf(host));
+}
 
 TEST(AccountCheckTest, APlainAccountIsInOrder) {
     EXPECT_EQ(AccountAnswer::InOrder, StateOf("512", "0", never));

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <functional>
 #include <iterator>
 #include <map>
 #include <pwd.h>
@@ -32,6 +33,8 @@ struct PlayedWinbindd {
     /// Users by the domain and the name that they are asked for.
     std::map<std::pair<std::string, std::string>, std::string> users;
     wbcErr lookup = WBC_ERR_SUCCESS;
+    /// What becomes of the question for an account.
+    std::function<wbcErr()> account = [] { return WBC_ERR_UNKNOWN_USER; };
 
     /// The one that is asked.
     static PlayedWinbindd& Here() {
@@ -128,6 +131,10 @@ wbcErr wbcCtxLookupName(wbcContext*, char const* domain, char const* name, wbcDo
     sid->num_auths = static_cast<std::uint8_t>(std::distance(here.users.begin(), found));
     *type = WBC_SID_NAME_USER;
     return WBC_ERR_SUCCESS;
+}
+
+wbcErr wbcCtxGetpwnam(wbcContext*, char const*, passwd**) {
+    return PlayedWinbindd::Here().account();
 }
 
 wbcErr wbcCtxGetpwsid(wbcContext*, wbcDomainSid* sid, passwd** entry) {
