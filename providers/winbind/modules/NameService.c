@@ -145,8 +145,9 @@ static enum nss_status CopyUser(struct passwd const* user, struct passwd* result
 }
 
 /* @param name null: `number` is asked for */
-static enum nss_status AskUser(LocalAccounts const* users, char const* name, uid_t number,
-                               struct passwd* result, Buffer buffer, int* errnop) {
+static enum nss_status AskUser(LocalAccounts const* users, LocalAccounts const* groups,
+                               char const* name, uid_t number, struct passwd* result, Buffer buffer,
+                               int* errnop) {
     Winbindd winbindd;
     struct passwd* user = NULL;
     enum nss_status status = NSS_STATUS_UNAVAIL;
@@ -156,8 +157,10 @@ static enum nss_status AskUser(LocalAccounts const* users, char const* name, uid
                           errnop);
     }
     if (status == NSS_STATUS_SUCCESS) {
-        /* Another spelling of the question may lead to a name that is local. */
-        status = IsLocalName(users, user->pw_name) || IsLocalNumber(users, user->pw_uid)
+        /* Another spelling of the question may lead to a name that is local. Whose primary group
+           is a local one would have what that group has. */
+        status = IsLocalName(users, user->pw_name) || IsLocalNumber(users, user->pw_uid) ||
+                         IsLocalNumber(groups, user->pw_gid)
                      ? NotFound(errnop)
                      : CopyUser(user, result, buffer, errnop);
         winbindd.freeMemory(user);
@@ -175,7 +178,11 @@ static enum nss_status FindUser(char const* name, uid_t number, struct passwd* r
     } else if (name != NULL ? IsLocalName(&users, name) : IsLocalNumber(&users, number)) {
         status = NotFound(errnop);
     } else {
-        status = AskUser(&users, name, number, result, buffer, errnop);
+        LocalAccounts groups = ReadLocalAccounts(LOCAL_GROUPS_FILE);
+        status = groups.text == NULL
+                     ? FilesUnreadable(errnop)
+                     : AskUser(&users, &groups, name, number, result, buffer, errnop);
+        FreeLocalAccounts(&groups);
     }
     FreeLocalAccounts(&users);
     return status;

@@ -197,6 +197,12 @@ TEST(NameServiceTest, AUserWithALocalNumberIsNobody) {
     EXPECT_EQ(NSS_STATUS_NOTFOUND, FindUser("CORP\\user1")->status);
 }
 
+TEST(NameServiceTest, AUserWhosePrimaryGroupIsLocalIsNobody) {
+    FakeWinbindd const winbindd(FakeWinbindd::Greeting(User("CORP\\user1", 2000001, 0)));
+    EXPECT_EQ(NSS_STATUS_NOTFOUND, FindUser("CORP\\user1")->status);
+    EXPECT_EQ(NSS_STATUS_NOTFOUND, FindUser(uid_t{2000001})->status);
+}
+
 TEST(NameServiceTest, AGroupWithALocalNameOrNumberIsNone) {
     {
         FakeWinbindd const winbindd(FakeWinbindd::Greeting(Group("root", 2000600, 0, "")));
