@@ -170,7 +170,7 @@ std::string ActiveDirectoryStore::GetDisplayName() const {
 }
 
 SystemConfiguration::PAMEntry ActiveDirectoryStore::GetPAMEntryForProvider() const {
-    return MakeProviderEntries(*_provider).pam;
+    return GetProviderEntries().pam;
 }
 
 void ActiveDirectoryStore::MakeActive() {
@@ -190,9 +190,7 @@ ActivationPlan ActiveDirectoryStore::GetWithdrawalPlan(EditForm form) const {
 }
 
 ProviderEntries ActiveDirectoryStore::GetProviderEntries() const {
-    auto entries = MakeProviderEntries(*_provider);
-    entries.pam = GetPAMEntryForProvider();
-    return entries;
+    return MakeProviderEntries(*_provider);
 }
 
 std::auto_ptr<StoreConfiguration> ActiveDirectoryStore::GetStoreConfiguration() const {

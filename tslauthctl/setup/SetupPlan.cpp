@@ -2,6 +2,7 @@
 #include "setup/SetupPlan.h"
 
 #include "access/AccessRules.h"
+#include "analysis/KnownStores.h"
 #include "setup/SetupPaths.h"
 #include "terminal/Console.h"
 
@@ -16,8 +17,6 @@ namespace tessel::tslauthctl {
 namespace {
 
 using namespace meaning;
-
-constexpr char noStore[] = "None";
 
 std::optional<std::string> ValueOf(std::string_view key, std::string_view text) {
     std::optional<std::string> value;
@@ -105,7 +104,7 @@ bool Serves(std::string const& policy, SetupFacts const& facts) {
 bool IsActive(SetupFacts const& facts) {
     auto const record = TextOf(Paths::AuthenticationConfiguration, facts);
     auto const store = ValueOf(Paths::RemoteAuthenticationStoreKey, record.value_or(""));
-    return store && *store != noStore;
+    return store && *store != NoStore;
 }
 
 void RequireInactive(std::string const& path, SetupFacts const& facts) {
@@ -123,7 +122,7 @@ FileChange PlanRecord(SetupFacts const& facts) {
         return {Paths::AuthenticationConfiguration, text, *text};
     }
     return Assigned(Paths::AuthenticationConfiguration, Paths::RemoteAuthenticationStoreKey,
-                    noStore, facts);
+                    NoStore, facts);
 }
 
 FileChange PlanProvider(SetupFacts const& facts) {
