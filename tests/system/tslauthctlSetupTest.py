@@ -242,6 +242,18 @@ class SetupTest(unittest.TestCase):
         self.assertFalse(PAM.exists())
         self.assertFalse(STATE.exists())
 
+    def test_purging_removes_the_policy_that_stayed_once_nothing_includes_it(self):
+        for included in (False, True):
+            leave_stock_host()
+            self.set_up()
+            direct = self.include_directly()
+            self.assertEqual(ask("unsetup")["exit"], LOSS)
+            if not included:
+                direct.unlink()
+            purge = subprocess.run(["sh", TREE / "debian/tslauthctl.postrm", "purge"], check=True,
+                                   text=True, stderr=subprocess.PIPE)
+            self.assertEqual((PAM.exists(), f"{PAM} stays" in purge.stderr), (included, included))
+
     def test_the_policy_stays_while_pam_auth_update_leaves_edited_files_alone(self):
         self.set_up()
         account = pathlib.Path("/etc/pam.d/common-account")
