@@ -4,7 +4,7 @@
 libpam, pam-auth-update and modules, but for Samba's module and the program that asks the domain,
 which are played. The users of the domain come from a file."""
 
-import filecmp
+import fcntl
 import os
 import pathlib
 import shutil
@@ -408,6 +408,12 @@ class SetupTest(unittest.TestCase):
         self.assertEqual(ACCESS.read_bytes(), before)
         self.assertEqual(ask("permit", "--force", "nobody-knows-it")["exit"], DONE)
         self.assertIn(b"+:nobody-knows-it:ALL\n", ACCESS.read_bytes())
+
+    def test_the_name_service_is_asked_before_other_changes_are_waited_for(self):
+        self.set_up_and_activate()
+        with open(LOCK, "a") as lock:
+            fcntl.flock(lock, fcntl.LOCK_EX)
+            self.assertEqual(ask("permit", "nobody-knows-it")["exit"], REFUSED)
 
     def test_permissions_are_previewed_listed_and_given_once(self):
         self.set_up_and_activate()

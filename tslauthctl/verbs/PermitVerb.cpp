@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "access/AccessRules.h"
 #include "access/NameLookup.h"
+#include "analysis/ChangeLog.h"
 #include "analysis/JoinedDomain.h"
 #include "setup/SetupArchive.h"
 #include "setup/SetupHost.h"
@@ -83,7 +84,21 @@ Subject AllOfTheDomain(Limit limit, Console& console) {
     return {*known.group, true};
 }
 
+void RequireWholeArguments(AccessArguments const& arguments) {
+    bool const isComplete = arguments.all ? arguments.names.empty() : !arguments.names.empty();
+    if (!isComplete || (arguments.trusted && !arguments.all)) {
+        throw Failure(ExitCode::usage, "Names are wanted, or --all; --trusted goes with --all");
+    }
+}
+
+/// Who the rules are to be about, for which others are asked: that may take a while. Nobody where
+/// nobody is to be permitted.
 std::vector<Subject> SubjectsOf(AccessArguments const& arguments, Limit limit, Console& console) {
+    RequireWholeArguments(arguments);
+    (void)ReadRules(); // no question where there is nothing to change
+    if (arguments.denies && arguments.all) {
+        return {};
+    }
     if (arguments.all && arguments.trusted) {
         return {Everybody()};
     }
@@ -103,25 +118,21 @@ std::vector<Subject> SubjectsOf(AccessArguments const& arguments, Limit limit, C
     return subjects;
 }
 
-std::string Edited(std::string text, AccessArguments const& arguments, Limit limit,
-                   Console& console) {
+std::string Edited(std::string text, AccessArguments const& arguments,
+                   std::vector<Subject> const& subjects) {
     if (arguments.denies && arguments.all) {
         return NobodyPermitted(text);
     }
-    for (auto const& subject : SubjectsOf(arguments, limit, console)) {
+    for (auto const& subject : subjects) {
         text = arguments.denies ? Denied(text, subject) : Permitted(text, subject);
     }
     return text;
 }
 
 /// Shows the difference and gives the text to write.
-std::string Preview(std::string const& before, AccessArguments const& arguments, Limit limit,
-                    Console& console) {
-    bool const isComplete = arguments.all ? arguments.names.empty() : !arguments.names.empty();
-    if (!isComplete || (arguments.trusted && !arguments.all)) {
-        throw Failure(ExitCode::usage, "Names are wanted, or --all; --trusted goes with --all");
-    }
-    auto after = Edited(before, arguments, limit, console);
+std::string Preview(std::string const& before, AccessArguments const& arguments,
+                    std::vector<Subject> const& subjects, Console& console) {
+    auto after = Edited(before, arguments, subjects);
     auto const diff = UnifiedDiff(Paths::AccessRules, before, after);
     console.Document()["changed"] = before != after;
     console.Document()["diff"] = diff;
@@ -138,8 +149,9 @@ nlohmann::json Described(std::string const& ruleName) {
 } // namespace
 
 ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& console) {
+    auto const subjects = SubjectsOf(arguments, limit, console);
     auto const before = ReadRules();
-    auto const after = Preview(before, arguments, limit, console);
+    auto const after = Preview(before, arguments, subjects, console);
     if (before == after) {
         console.Line("Nothing would have to be changed.");
     }
@@ -148,9 +160,12 @@ ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& c
 
 ExitCode RunAccess(AccessArguments const& arguments, Limit limit, Console& console) {
     RequireRoot(arguments.denies ? "deny" : "permit");
+    ChangeLog::Begin();
+    // Not while everybody else has to wait for the answers.
+    auto const subjects = SubjectsOf(arguments, limit, console);
     HostChange const change(console);
     auto const before = ReadRules();
-    auto const after = Preview(before, arguments, limit, console);
+    auto const after = Preview(before, arguments, subjects, console);
     if (before == after) {
         console.Line("Nothing had to be changed.");
         return ExitCode::done;
