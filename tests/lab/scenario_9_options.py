@@ -159,7 +159,7 @@ def off_line(lab, host):
     finally:
         outage.find(host, lab.dc1)
     # Not plain1: winbindd goes on for minutes not to know whom it was asked for in vain.
-    with lab.step("controller back for 40 s: CORP\\joiner1, who never logged in, is let in") as step:
+    with lab.step("controller back for 40 s: CORP\\joiner1, never let in before, is") as step:
         time.sleep(40)
         step.took(LogIn(host, "CORP\\joiner1", PASSWORD).is_let_in())
     with lab.step("controller back: whom the domain disables now is refused"):

@@ -29,8 +29,8 @@ ActivationPlan WithdrawalOf(EntriesList const& entries) {
     return plan;
 }
 
-/// The way back from a provider that is gone, ends whoever loads it, or is not to be loaded: nothing
-/// but what is recorded is known of its entries.
+/// The way back from a provider that is gone, ends whoever loads it, or is not to be loaded:
+/// nothing but what is recorded is known of its entries.
 ActivationPlan PlanForNoneWithoutProvider(HostPlan& plan) {
     ActivationPlan steps;
     if (RecordedStore() == NoStore) {

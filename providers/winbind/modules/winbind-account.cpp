@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// What the PAM module asks of the domain. A program of its own, so that a log-in can end it: what it
-// asks may hang.
+// What the PAM module asks of the domain. A program of its own, so that a log-in can end it: what
+// it asks may hang.
 //
 //   winbind-account USER      prints whether the domain lets the user log in
 //   winbind-account --reach   tells winbindd whether a controller can be reached, where it matters

@@ -14,11 +14,12 @@ class Host;
 typedef std::function<bool(std::string const& domain)> Reach;
 
 /// Before a password is tried, on a host whose users may log in while no controller answers: tells
-/// winbindd to go by its memory where none can be reached, and not to where one can again. By itself
-/// it notices after minutes, in which it lets nobody in. Does nothing on other hosts. Needs root.
+/// winbindd to go by its memory where none can be reached, and not to where one can again. By
+/// itself it notices after minutes, in which it lets nobody in. Does nothing on other hosts. Needs
+/// root.
 ///
-/// Where none was reached, the next half minute does without a look, so that only the first of several
-/// log-ins waits for one.
+/// Where none was reached, the next half minute does without a look, so that only the first of
+/// several log-ins waits for one.
 void TellWinbinddOfControllers(Host const& host, Reach const& isReachable,
                                Clock::time_point deadline);
 
