@@ -8,7 +8,8 @@ get_filename_component(libraries "${CMAKE_CURRENT_LIST_DIR}/../build/${architect
                        ABSOLUTE)
 
 if(architecture STREQUAL "i386")
-    # The machine runs these programs itself, with the C and C++ libraries of g++-multilib.
+    # The machine runs these programs itself, with the C and C++ libraries of the
+    # compiler's multilib package.
     set(CMAKE_SYSTEM_PROCESSOR i686)
     set(CMAKE_C_COMPILER gcc)
     set(CMAKE_CXX_COMPILER g++)
