@@ -117,7 +117,9 @@ std::optional<std::string> ReadUntilClosed(base::Descriptor const& descriptor,
         auto const left = std::chrono::duration_cast<std::chrono::milliseconds>(
             deadline - std::chrono::steady_clock::now());
         pollfd waited = {descriptor.Get(), POLLIN, 0};
-        int const ready = poll(&waited, 1, static_cast<int>(std::max<long>(left.count(), 0)));
+        int const ready =
+            poll(&waited, 1,
+                 static_cast<int>(std::max<std::chrono::milliseconds::rep>(left.count(), 0)));
         if (ready == 0) {
             return std::nullopt;
         }
