@@ -467,6 +467,7 @@ class Provider(Case):
         set_up(provider="x/../../../../tmp/y")
         self.assertIn("its name holds a '/'", self.refused())
 
+    @unittest.skipIf(os.environ.get("TSLAUTH_SANITIZE"), "the sanitizer catches the signal itself")
     def test_a_truncated_one_is_found_out_in_a_child(self):
         whole = pathlib.Path("/usr/libexec/tslauth/libexample.so").read_bytes()
         path = pathlib.Path("/usr/libexec/tslauth/libtruncated.so")
