@@ -2,6 +2,7 @@
 #include "analysis/ChangeLog.h"
 #include "analysis/Failures.h"
 #include "analysis/NearestName.h"
+#include "terminal/StandardDescriptors.h"
 #include "verbs/Verbs.h"
 
 #if defined(__GNUC__)
@@ -495,6 +496,7 @@ int Run(std::vector<char*> words) {
 } // namespace
 
 int main(int argc, char** argv) {
+    OpenClosedStandardDescriptors();
     try {
         int const exitCode = Run(WithHelpAsOption(argc, argv));
         if (HasAbandonedCalls()) {

@@ -368,7 +368,17 @@ class FromElsewhere(Case):
         os.close(descriptor)
         self.ends(USAGE, "--password-fd", "77")
         self.ends(USAGE, "--password-fd", "-1")
-        self.ends(USAGE, "--password-stdin", preexec_fn=lambda: os.close(0))
+
+    def test_a_closed_input_is_never_what_is_opened_in_its_place(self):
+        for _ in range(20):
+            self.ends(USAGE, "--password-stdin", preexec_fn=lambda: os.close(0))
+
+    def test_closed_outputs_are_not_written_by_way_of_another_file(self):
+        before = state((NSS, RECORD))
+        process = subprocess.run([TOOL, "status"], timeout=60,
+                                 preexec_fn=lambda: (os.close(0), os.close(1), os.close(2)))
+        self.assertEqual(FAILURE, process.returncode)
+        self.assertEqual(before, state((NSS, RECORD)))
 
     def test_a_file_of_its_owner_alone(self):
         self.ends(DONE, "--password-file", str(self.file))

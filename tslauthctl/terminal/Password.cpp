@@ -124,9 +124,10 @@ void ReadFromFile(std::string const& path, Secret& secret) {
 }
 
 void ReadFromDescriptor(int descriptor, std::string const& name, Secret& secret) {
-    if (fcntl(descriptor, F_GETFD) < 0) {
-        throw Failure(ExitCode::usage,
-                      "The password cannot be read from " + name + ": " + SystemText(errno));
+    int const flags = fcntl(descriptor, F_GETFL);
+    if (flags < 0 || (flags & O_ACCMODE) == O_WRONLY) {
+        throw Failure(ExitCode::usage, "The password cannot be read from " + name + ": " +
+                                           SystemText(flags < 0 ? errno : EBADF));
     }
     ReadFrom(descriptor, name, secret);
 }
