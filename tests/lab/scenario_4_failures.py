@@ -162,7 +162,7 @@ FIND = "ip neighbour delete 10.99.0.1 dev eth0"
 
 # The names come from another machine, so that only the controller is silent.
 SILENT = Attempt("controller that is silent, never met", 1311, UNREACHABLE,
-                 before=f"echo nameserver 10.99.0.53 >/etc/resolv.conf; {LOSE}", after=FIND)
+                 before=f"echo nameserver 10.99.0.253 >/etc/resolv.conf; {LOSE}", after=FIND)
 ACCOUNTS = [
     Attempt("wrong password", 1326, CREDENTIALS, password="Not-the-Passw0rd"),
     Attempt("unknown user", 1326, CREDENTIALS, user="nobody1"),
@@ -200,7 +200,7 @@ NETWORK = [
 SILENT_NAMES = [
     Attempt("name server that is silent", 10060, UNREACHABLE, before=LOSE, after=FIND),
     Attempt("name server whose address nobody has", 1355, UNREACHABLE,
-            before="echo nameserver 10.99.0.77 >/etc/resolv.conf",
+            before="echo nameserver 10.99.0.252 >/etc/resolv.conf",
             after="echo nameserver 10.99.0.1 >/etc/resolv.conf"),
 ]
 SILENT_WARM = Attempt("controller that is silent, joined to before", SILENT.code, SILENT.exit_code,

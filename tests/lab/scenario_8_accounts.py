@@ -114,12 +114,14 @@ def set_up(lab):
 
 
 def keys_and_closed_accounts(lab, host):
-    for user in ("CORP\\user1", "root", "lena"):
+    for user in ("CORP\\user1", "OTHER\\user2", "root", "lena"):
         with lab.step(f"by key: {user} is let in") as step:
             step.took(is_let_in(host, user).seconds)
     for user, told in CLOSED.items():
         with lab.step(f"by key: CORP\\{user} is refused, and told why") as step:
             step.took(is_refused(host, f"CORP\\{user}", told).seconds)
+    with lab.step("by key: OTHER\\disabled2, trusted, is refused, and told why") as step:
+        step.took(is_refused(host, "OTHER\\disabled2", CLOSED["disabled1"]).seconds)
     with lab.step("by key: whom the domain disables is refused from then on, until enabled"):
         lab.dc1.samba_tool("user", "disable", "user1")
         is_refused(host, "CORP\\user1", CLOSED["disabled1"])
