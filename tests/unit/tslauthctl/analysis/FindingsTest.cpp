@@ -94,6 +94,12 @@ TEST(FindingsTest, TheTrustAndWhatWasNotLookedAtAreTold) {
 
 TEST(FindingsTest, StatesOfTheTrustHaveWords) {
     EXPECT_STREQ("in-order", TrustWord(0));
+    EXPECT_STREQ("secret-refused", TrustWord(1));
+    EXPECT_STREQ("no-controller", TrustWord(2));
+    EXPECT_STREQ("service-not-running", TrustWord(3));
+    EXPECT_STREQ("service-not-answering", TrustWord(4));
+    EXPECT_STREQ("unknown", TrustWord(5));
+    EXPECT_STREQ("clocks-apart", TrustWord(6));
     EXPECT_STREQ("not-joined", TrustWord(7));
     EXPECT_STREQ("other", TrustWord(8));
     EXPECT_STREQ("other", TrustWord(-1));
