@@ -268,4 +268,18 @@ std::string ActiveDirectoryProvider::GetLastFailure() const {
     return entry == nullptr ? std::string() : TextOrEmpty(entry());
 }
 
+std::string ActiveDirectoryProvider::PreviewJoin(std::string const& domain,
+                                                 std::string const& organisationalUnit,
+                                                 Credentials const* credentials) const {
+    auto const entry = reinterpret_cast<decltype(&ActiveDirectoryClientPreviewJoin)>(
+        dlsym(_library.get(), "ActiveDirectoryClientPreviewJoin"));
+    if (entry == nullptr) {
+        return {};
+    }
+    return StringFrom([&](auto... slots) {
+        return entry(domain.c_str(), OptionalText(organisationalUnit),
+                     credentials == nullptr ? nullptr : RecordOf(*credentials), slots...);
+    });
+}
+
 } // namespace tessel::authentication

@@ -261,6 +261,12 @@ std::string ActiveDirectoryStore::GetLastFailure() const {
     return _provider->GetLastFailure();
 }
 
+std::string ActiveDirectoryStore::PreviewJoin(std::string const& domain,
+                                              std::string const& organisationalUnit,
+                                              Credentials const* credentials) const {
+    return _provider->PreviewJoin(domain, organisationalUnit, credentials);
+}
+
 void ActiveDirectoryStore::GetStoreConfigurationInt(
     ProviderPointer provider, StatePointer state,
     boost::shared_ptr<ActiveDirectoryStoreConfiguration> cache) {

@@ -67,6 +67,17 @@ def fastest_log_in(host):
     return min(LogIn(host, "lena", LOCAL_PASSWORD).is_let_in() for _ in range(5))
 
 
+def preview(lab, host, target, *lines):
+    """What a dry run tells in joiner1's name, of an account that stays as it was."""
+    host.exits(7, "tslauthctl", "join", "corp.example", "--dry-run")
+    before = lab.dc1.account_of(host)
+    told = host.exits(7, "tslauthctl", "join", target, "--dry-run", "--user", "joiner1",
+                      "--password-stdin", text=PASSWORD + "\n").out
+    for line in ("controller: dc1.corp.example", f"computer: {host.name.upper()}", *lines):
+        expect(line + "\n" in told, f"no '{line}' in\n{told}")
+    expect_equal(lab.dc1.account_of(host), before, "the account")
+
+
 def stands_in(lab, host, folder):
     account = lab.dc1.account_of(host)
     expect(account, f"the controller has no account {host.name}$")
@@ -115,6 +126,11 @@ def joins(lab, path, short, long):
 
 
 def plain_join(lab, host):
+    with lab.step(f"{host.name}: a dry run tells of controller, clock, name, unit and account"):
+        preview(lab, host, "corp.example/Servers", "unit: OU=Servers,DC=corp,DC=example",
+                "account: there is none of this name yet", "host: can be joined")
+        preview(lab, host, "corp.example/Attic",
+                "unit: 'OU=Attic,DC=corp,DC=example' is not there; the join would be refused")
     lab.tell(join_story(lab, host, "tslauthctl join corp.example", host.join, COMPUTERS))
     with lab.step(f"{host.name}: its address has the name {host.name}.corp.example"):
         address = host.ok("hostname", "-I").out.strip()

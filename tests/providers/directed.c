@@ -76,6 +76,15 @@ char const* ActiveDirectoryClientLastFailure(void) {
     return text;
 }
 
+int ActiveDirectoryClientPreviewJoin(char const* domain, char const* organisationalUnit,
+                                     ActiveDirectoryClientCredentials const* credentials,
+                                     char** text, ActiveDirectoryClientFreeFunction* release) {
+    (void)domain;
+    (void)organisationalUnit;
+    (void)credentials;
+    return PlayText("preview-join", text, release);
+}
+
 static int JoinDomain(char const* domain, char const* organisationalUnit,
                       ActiveDirectoryClientCredentials const* credentials) {
     (void)domain, (void)organisationalUnit, (void)credentials;

@@ -147,6 +147,17 @@ class Membership(Case):
         self.assertEqual(before, (HOSTS.read_bytes(), RESOLV.read_bytes()))
         self.assertEqual(NOT_JOINED, ask("info")["exit"])
 
+    def test_a_dry_run_tells_what_the_provider_finds(self):
+        script(preview_join="clock: 2 seconds behind\n", get_any_domain_controller="dc1")
+        document = ask("join", "example.test", "--dry-run")
+        self.assertEqual({"clock": "2 seconds behind"}, document["found"])
+        text = run("join", "example.test", "--dry-run").stdout.decode()
+        self.assertIn("clock: 2 seconds behind\n", text)
+        script(preview_join="code 1326", get_any_domain_controller="dc1")
+        document = ask("join", "example.test", "--dry-run", "--user", "joiner", "--password-stdin",
+                       input=b"wrong\n")
+        self.assertEqual(CREDENTIALS, document["exit"])
+
     def management_address(self):
         self.addCleanup(subprocess.run, ["ip", "link", "delete", "management"])
         command("sh", "-c", "ip link add management type dummy 2>/dev/null || "

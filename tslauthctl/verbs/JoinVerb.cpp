@@ -7,6 +7,7 @@
 #include "verbs/Verbs.h"
 
 #include <base/AsciiText.h>
+#include <sstream>
 
 namespace tessel::tslauthctl {
 
@@ -59,6 +60,7 @@ void Describe(JoinArguments const& arguments, Console& console) {
     document["hostname_checked"] = !arguments.skipHostnameCheck;
     document["dropped_names"] = nlohmann::json::array();
     document["put_back"] = nlohmann::json::array();
+    document["found"] = nlohmann::json::object();
     if (IsCAM(arguments)) {
         document["cam_server"] = arguments.server;
     } else {
@@ -195,6 +197,46 @@ std::shared_ptr<Secret> AskForPassword(JoinArguments const& arguments) {
     return password;
 }
 
+/// What the provider finds in the way of a join; empty where it does not tell.
+std::string Preview(JoinArguments const& arguments, std::string const& domain,
+                    std::shared_ptr<ActiveDirectoryStore> const& store, Limit limit,
+                    Console& console) {
+    auto const password = arguments.account.user ? AskForPassword(arguments) : nullptr;
+    auto const account = password ? Account::given : Account::none;
+    return Explaining(account, [&] {
+        return Ask(console, "the provider to look at " + domain, limit,
+                   [store, domain, unit = UnitOf(arguments), password, account,
+                    user = arguments.account.user.value_or("")] {
+                       return WithCause(*store, account, [&] {
+                           if (!password) {
+                               return store->PreviewJoin(domain, unit, nullptr);
+                           }
+                           LastUse const lastUse(*password);
+                           Credentials const credentials = {user.c_str(), password->Text()};
+                           return store->PreviewJoin(domain, unit, &credentials);
+                       });
+                   });
+    });
+}
+
+/// @param findings one line each, "what: finding"
+void TellFindings(std::string const& findings, Console& console) {
+    auto& found = console.Document()["found"];
+    found = nlohmann::json::object();
+    std::istringstream lines(findings);
+    for (std::string line; std::getline(lines, line);) {
+        console.Line(line);
+        auto const colon = line.find(": ");
+        if (colon != std::string::npos) {
+            found[line.substr(0, colon)] = line.substr(colon + 2);
+        }
+    }
+    if (findings.empty()) {
+        console.Note("The provider does not look at the clock, the unit and the account before it "
+                     "joins.");
+    }
+}
+
 /// What a join would find and write.
 ExitCode TellJoin(JoinArguments const& arguments,
                   std::shared_ptr<ActiveDirectoryStore> const& store, Limit limit,
@@ -204,13 +246,12 @@ ExitCode TellJoin(JoinArguments const& arguments,
     console.Line("The host would be joined to " + domain + ".");
     auto const unit = UnitOf(arguments);
     console.Line("organisational unit: " + (unit.empty() ? "left to the domain" : unit));
+    TellFindings(Preview(arguments, domain, store, limit, console), console);
     if (!arguments.skipHostnameCheck) {
         console.Line("The host's entry in /etc/hosts would be set, and where its full name is of "
                      "another domain, " +
                      domain + " would become a search domain.");
     }
-    console.Note("The clock, the unit and an account of the host's name are looked at by the join "
-                 "itself.");
     return ExitCode::changes;
 }
 

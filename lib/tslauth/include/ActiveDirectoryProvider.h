@@ -114,6 +114,14 @@ public:
     /// anything else is asked of the provider on this thread. Does not block.
     std::string GetLastFailure() const;
 
+    /// What a join would meet, one line each, "what: finding"; see `tslauth_provider.h`. Nothing is
+    /// changed. Empty where the provider does not tell. Blocks as a join does.
+    /// @param organisationalUnit empty: where the domain puts new computers
+    /// @param credentials null: nobody's, and what takes an account is not told
+    /// @throws what the provider's code stands for
+    std::string PreviewJoin(std::string const& domain, std::string const& organisationalUnit,
+                            Credentials const* credentials) const;
+
 private:
     void CacheMetadata();
 

@@ -237,6 +237,15 @@ public:
     /// workers.
     std::string GetLastFailure() const;
 
+    /// What a join would meet, one line each, "what: finding", such as "clock: 2 seconds behind".
+    /// Nothing is changed, neither here nor in the directory. Empty where the provider does not
+    /// tell. Blocks as a join does.
+    /// @param organisationalUnit empty: where the domain puts new computers
+    /// @param credentials null: nobody's, and what takes an account is not told
+    /// @throws what `JoinDomain` throws for the provider's failures
+    std::string PreviewJoin(std::string const& domain, std::string const& organisationalUnit,
+                            Credentials const* credentials) const;
+
 private:
     typedef boost::shared_ptr<ActiveDirectoryProvider> ProviderPointer;
     typedef boost::shared_ptr<RequestState> StatePointer;

@@ -272,6 +272,19 @@ typedef struct ActiveDirectoryClientOperationsRecord {
  * that it belongs to no version, and a provider without it is as good as before. */
 extern TSLAUTH_PROVIDER_EXPORT char const* ActiveDirectoryClientLastFailure(void);
 
+/* A fourth symbol, which a provider may define: looks at what a join would meet, and changes
+ * nothing on the host nor in the directory. The arguments are those of `joinDomain`, but the
+ * credentials may be null; then nothing is told that takes an account. Stores one line each,
+ * "what: finding", with a line feed behind each: what was looked at ("controller", "clock",
+ * "computer", "unit", "account", or others), and what was found, in words for an administrator.
+ * What would stop the join is a finding as well. `release` is called once with the text, unless it
+ * is null. Returns a code, where nothing can be told. Asked for by its name alone, as the third
+ * one. */
+extern TSLAUTH_PROVIDER_EXPORT int
+ActiveDirectoryClientPreviewJoin(char const* domain, char const* organisationalUnit,
+                                 ActiveDirectoryClientCredentials const* credentials, char** text,
+                                 ActiveDirectoryClientFreeFunction* release);
+
 /* The two symbols that a provider must define. Include this header where they are defined: it gives
  * them their linkage and their visibility, and the compiler checks them. */
 extern TSLAUTH_PROVIDER_EXPORT ActiveDirectoryClientMetadataRecord const

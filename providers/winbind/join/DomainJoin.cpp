@@ -131,6 +131,20 @@ FreeHost LookAtHost(Host const& host, Order const& order) {
     return {folders, Membership::Read(host)};
 }
 
+ControllerAnswer FindController(Host const& host, Order const& order,
+                                std::vector<std::string> const& candidates,
+                                StagingFolder& staging) {
+    staging.Configure(Guess(order), order.domain, {});
+    return DomainDiscovery::FindController(host, SambaTools(host, staging), order.domain,
+                                           candidates, order.deadline);
+}
+
+/// What the tools need to know once a controller has answered.
+void Configure(StagingFolder& staging, Order const& order, ControllerAnswer const& answer) {
+    staging.Configure({answer.Realm(), answer.netBIOSDomain, order.computer, {}}, order.domain,
+                      {answer.controller});
+}
+
 /// Phase 2: a controller, whose name and clock fit this host, and the tools' configuration for it.
 /// @param first asked before the preferred controllers; may be empty
 Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
@@ -140,14 +154,11 @@ Partner FindPartner(Host const& host, Order const& order, FreeHost const& free,
     if (!first.empty()) {
         candidates.insert(candidates.begin(), first);
     }
-    staging.Configure(Guess(order), order.domain, {});
-    SambaTools const tools(host, staging);
-    auto const answer =
-        DomainDiscovery::FindController(host, tools, order.domain, candidates, order.deadline);
+    auto const answer = FindController(host, order, candidates, staging);
     DomainDiscovery::CheckHostName(host, order.computer, answer, order.domain);
-    auto const ahead = DomainDiscovery::CheckClock(tools, answer.controller, order.deadline);
-    staging.Configure({answer.Realm(), answer.netBIOSDomain, order.computer, {}}, order.domain,
-                      {answer.controller});
+    auto const ahead =
+        DomainDiscovery::CheckClock(SambaTools(host, staging), answer.controller, order.deadline);
+    Configure(staging, order, answer);
     std::string const secrets = LocalMembership::SecretsBeforeJoin(host, free.folders);
     if (!secrets.empty()) {
         staging.SetSecrets(secrets);
@@ -328,13 +339,101 @@ Order OrderOf(Host const& host, std::string const& domain) {
             Clock::now() + std::chrono::seconds(TSLAUTH_WINBIND_JOIN_SECONDS) - undoTime};
 }
 
+std::string PlaceOf(Order const& order, std::string const& unit) {
+    return unit.empty() ? unit : ReadOrganisationalUnit(unit, order.domain).distinguishedName;
+}
+
+/// Of a preview: what was looked at, and what was found.
+std::string Finding(char const* what, std::string const& found) {
+    return std::string(what) + ": " + found + '\n';
+}
+
+/// What `look` finds; where it fails, what would stop a join.
+template <typename Look> std::string Finding(char const* what, Look look) {
+    std::string found;
+    try {
+        found = look();
+    } catch (Failure const& e) {
+        found = std::string(e.what()) + "; the join would be refused";
+    }
+    return Finding(what, found);
+}
+
+std::string ClockText(std::chrono::seconds ahead) {
+    std::string const seconds = std::to_string(std::chrono::abs(ahead).count());
+    return ahead.count() == 0
+               ? "as the controller's"
+               : seconds + " seconds " + (ahead.count() > 0 ? "behind" : "ahead of") +
+                     " the controller's";
+}
+
+/// What the directory says, asked as `account`; as nobody it says nothing.
+std::string DirectoryFindings(Order const& order, std::string const& controller,
+                              std::string const& place, Account const* account,
+                              SambaTools const& tools) {
+    if (!account) {
+        std::string const unknown = "not looked at, which takes an account";
+        return Finding("unit", place.empty() ? "left to the domain" : place + ": " + unknown) +
+               Finding("account", unknown);
+    }
+    std::string const name = tools.ComputerAttribute(
+        controller, order.computer, "distinguishedName", *account, ToolDeadline(order));
+    return Finding("unit",
+                   [&] {
+                       if (place.empty()) {
+                           return std::string("left to the domain");
+                       }
+                       if (!tools.Exists(controller, place, *account, ToolDeadline(order))) {
+                           throw Failure(TSLAUTH_PROVIDER_INVALID_PARAMETER,
+                                         "'" + place + "' is not there");
+                       }
+                       return place;
+                   }) +
+           Finding("account", name.empty() ? "there is none of this name yet"
+                                           : "'" + name + "' is there, and would be taken over");
+}
+
 } // namespace
+
+std::string Preview(Host const& host, std::string const& domain, std::string const& unit,
+                    ActiveDirectoryClientCredentials const* credentials) {
+    Order const order = OrderOf(host, domain);
+    std::string const place = PlaceOf(order, unit);
+    std::optional<Account> account;
+    if (credentials) {
+        account.emplace(*credentials);
+    }
+    RequirePrograms(host);
+    SambaFolders const folders = ReadSambaFolders(host, order.deadline);
+    StagingFolder staging(host.At(Paths::Staging));
+    auto const answer =
+        FindController(host, order, PreferredControllers(host.At(Paths::State)).Read(), staging);
+    Configure(staging, order, answer);
+    SambaTools const tools(host, staging);
+    return Finding("host",
+                   [&] {
+                       RequireNotJoined(host, folders, order.deadline);
+                       LocalMembership::RequireRoom(host, folders);
+                       return std::string("can be joined");
+                   }) +
+           Finding("controller", answer.controller) +
+           Finding("clock",
+                   [&] {
+                       return ClockText(
+                           DomainDiscovery::CheckClock(tools, answer.controller, order.deadline));
+                   }) +
+           Finding("computer",
+                   [&] {
+                       DomainDiscovery::CheckHostName(host, order.computer, answer, order.domain);
+                       return order.computer;
+                   }) +
+           DirectoryFindings(order, answer.controller, place, account ? &*account : nullptr, tools);
+}
 
 void WithCredentials(Host const& host, std::string const& domain, std::string const& unit,
                      ActiveDirectoryClientCredentials const& credentials) {
     Order const order = OrderOf(host, domain);
-    std::string const place =
-        unit.empty() ? unit : ReadOrganisationalUnit(unit, order.domain).distinguishedName;
+    std::string const place = PlaceOf(order, unit);
     Account const account(credentials);
 
     OperationLock const lock(host.At(Paths::Lock), order.deadline);

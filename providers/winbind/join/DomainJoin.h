@@ -30,6 +30,15 @@ void WithCredentials(Host const& host, std::string const& domain, std::string co
 void WithMachineAccount(Host const& host, ActiveDirectoryClientDomainInformation const& information,
                         ActiveDirectoryClientMachineAccount const& account);
 
+/// What `WithCredentials` would meet, one line each, "what: finding", with what would stop it.
+/// Changes nothing, neither here nor in the directory; a join or a part that runs meanwhile is not
+/// waited for.
+/// @param credentials null: nobody's, and the directory tells of no unit and no account
+/// @throws Failure where nothing can be told: no controller answers, an argument is malformed, the
+///         credentials are refused
+std::string Preview(Host const& host, std::string const& domain, std::string const& unit,
+                    ActiveDirectoryClientCredentials const* credentials);
+
 /// What can be known before a controller is asked: whether the host is joined already, the programs
 /// are there, and a staging folder and room on the disks can be had. Changes nothing, and puts
 /// nothing in order either; a join or a part that runs meanwhile is not waited for.

@@ -157,6 +157,19 @@ ActiveDirectoryClientOperationsRecord const ActiveDirectoryClientOperations = {
     &GetDomainTrustRelationshipEntry,
 };
 
+int ActiveDirectoryClientPreviewJoin(char const* domain, char const* organisationalUnit,
+                                     ActiveDirectoryClientCredentials const* credentials,
+                                     char** text, ActiveDirectoryClientFreeFunction* release) {
+    return CodeOf("preview join", [&] {
+        if (credentials != nullptr) {
+            RequireBoth(*credentials);
+        }
+        HandOut(
+            DomainJoin::Preview(ThisHost(), domain, TextOrEmpty(organisationalUnit), credentials),
+            text, release);
+    });
+}
+
 char const* ActiveDirectoryClientLastFailure() {
     return LastFailure();
 }

@@ -201,13 +201,28 @@ std::string SambaTools::ComputerAttribute(std::string const& controller,
                                           std::string const& computer, std::string const& attribute,
                                           Account const& account,
                                           Clock::time_point deadline) const {
+    auto const entries = Search(controller, "(sAMAccountName=" + EscapedForFilter(computer) + "$)",
+                                attribute, account, deadline);
+    return entries.empty() ? std::string() : ValueIn(entries.front(), attribute);
+}
+
+bool SambaTools::Exists(std::string const& controller, std::string const& distinguishedName,
+                        Account const& account, Clock::time_point deadline) const {
+    return !Search(controller, "(distinguishedName=" + EscapedForFilter(distinguishedName) + ")",
+                   "distinguishedName", account, deadline)
+                .empty();
+}
+
+std::vector<DirectoryEntry> SambaTools::Search(std::string const& controller,
+                                               std::string const& filter,
+                                               std::string const& attribute, Account const& account,
+                                               Clock::time_point deadline) const {
     ChildProcess::Task task = Task();
     Append(task, {"ads", "search", "-S", controller.c_str()});
     account.AddTo(task);
-    task.arguments.push_back("(sAMAccountName=" + EscapedForFilter(computer) + "$)");
+    task.arguments.push_back(filter);
     task.arguments.push_back(attribute);
-    auto const entries = ReadDirectoryEntries(RunToSuccess(*_host, task, deadline));
-    return entries.empty() ? std::string() : ValueIn(entries.front(), attribute);
+    return ReadDirectoryEntries(RunToSuccess(*_host, task, deadline));
 }
 
 bool SambaTools::HasMachineSecret(Clock::time_point deadline) const {

@@ -4,11 +4,13 @@
 #include "host/ChildProcess.h"
 #include "host/SambaFolders.h"
 #include "samba/Account.h"
+#include "samba/DirectorySearch.h"
 #include "text/ControllerAnswer.h"
 
 #include <chrono>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace tessel::winbind {
 
@@ -70,11 +72,18 @@ public:
                                   std::string const& attribute, Account const& account,
                                   Clock::time_point deadline) const;
 
+    /// Whether there is an object of this distinguished name.
+    bool Exists(std::string const& controller, std::string const& distinguishedName,
+                Account const& account, Clock::time_point deadline) const;
+
     /// Whether the secrets hold those of a domain's member. Asks nobody.
     bool HasMachineSecret(Clock::time_point deadline) const;
 
 private:
     ChildProcess::Task Task() const;
+    std::vector<DirectoryEntry> Search(std::string const& controller, std::string const& filter,
+                                       std::string const& attribute, Account const& account,
+                                       Clock::time_point deadline) const;
 
     Host const* _host;
     std::string _configuration; ///< empty: the host's, here and below

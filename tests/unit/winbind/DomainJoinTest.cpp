@@ -91,6 +91,60 @@ void Prepare(PlayedHost& host, Start const& start) {
     }
 }
 
+std::string Preview(PlayedHost const& host, std::string const& unit = "",
+                    char const* password = nullptr) {
+    ActiveDirectoryClientCredentials const credentials = {"joiner", password};
+    return DomainJoin::Preview(host, domain, unit, password ? &credentials : nullptr);
+}
+
+TEST(DomainJoinTest, APreviewTellsWhatItFindsAndChangesNothing) {
+    for (Start const& start : starts) {
+        PlayedHost host;
+        Prepare(host, start);
+        auto const before = host.Tree();
+        EXPECT_EQ("host: can be joined\n"
+                  "controller: dc1.corp.example\n"
+                  "clock: as the controller's\n"
+                  "computer: NODE\n"
+                  "unit: left to the domain\n"
+                  "account: not looked at, which takes an account\n",
+                  Preview(host));
+        EXPECT_EQ(before, host.Tree());
+        EXPECT_FALSE(host.State().hasAccount);
+        EXPECT_EQ(start.daemonRuns, host.State().daemonRuns);
+    }
+}
+
+TEST(DomainJoinTest, APreviewInSomebodysNameAsksTheDirectory) {
+    PlayedHost host;
+    host.directory = {{"(sAMAccountName=", "Got 0 replies\n\n"},
+                      {"(distinguishedName=OU=Servers,", "Got 1 replies\n\n"
+                                                         "distinguishedName: OU=Servers\n"},
+                      {"(distinguishedName=", "Got 0 replies\n\n"}};
+    EXPECT_THAT(Preview(host, "Servers", "secret"),
+                HasSubstr("unit: OU=Servers,DC=corp,DC=example\n"
+                          "account: there is none of this name yet\n"));
+    EXPECT_THAT(Preview(host, "Nowhere", "secret"),
+                HasSubstr("unit: 'OU=Nowhere,DC=corp,DC=example' is not there; the join would be "
+                          "refused\n"));
+    host.directory = {{"(sAMAccountName=", "Got 1 replies\n\n"
+                                           "distinguishedName: CN=NODE,OU=Old\n"}};
+    EXPECT_THAT(Preview(host, "", "secret"),
+                HasSubstr("account: 'CN=NODE,OU=Old' is there, and would be taken over\n"));
+}
+
+TEST(DomainJoinTest, APreviewTellsWhatWouldStopTheJoin) {
+    PlayedHost host;
+    host.SetInfo("Server time offset: 400\n");
+    EXPECT_THAT(Preview(host), HasSubstr("clock: the clock of 'dc1.corp.example' is ahead by 400 "
+                                         "seconds; the join would be refused\n"));
+    host.SetInfo("Server time offset: -7\n");
+    EXPECT_THAT(Preview(host), HasSubstr("clock: 7 seconds ahead of the controller's\n"));
+    ASSERT_EQ(0U, Join(host));
+    EXPECT_THAT(Preview(host), HasSubstr("host: this host is joined to 'corp.example'; the join "
+                                         "would be refused\n"));
+}
+
 TEST(DomainJoinTest, AHostIsJoinedAndPartedByteForByte) {
     for (Start const& start : starts) {
         PlayedHost host;
