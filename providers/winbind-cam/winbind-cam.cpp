@@ -6,6 +6,7 @@
 #include "Protocol.h"
 #include "TlsConnection.h"
 #include "join/DomainJoin.h"
+#include "record/Uncancelled.h"
 #include "samba/ThisHost.h"
 
 #include <tslauth/tslauth_cam_provider.h>
@@ -85,6 +86,7 @@ void CreateAccount(char const* server, Trust const& trust, char const* accountNa
 
 /// Runs an entry; nothing but a code leaves it.
 template <typename Entry> int Guarded(char const* name, Entry entry) noexcept {
+    Uncancelled const call;
     try {
         ForgetResults();
         entry();

@@ -16,7 +16,9 @@
  * Each of them must be safe to call at the same time as every other, itself included. A call may
  * block; some of them are made on threads that nobody waits for any longer. The child of a process
  * that forked during a call makes calls of its own: a lock that the provider held stays held there,
- * unless it sees to that with pthread_atfork(3).
+ * unless it sees to that with pthread_atfork(3). A thread may be cancelled in a call; what the call
+ * has opened and allocated may be lost then, and the other threads go on. Who holds a lock, or is
+ * written in C++, keeps the cancellation off meanwhile with pthread_setcancelstate(3).
  *
  * Memory. Arguments belong to the caller and are valid during the call alone. Results belong to
  * the provider until it gives them up by storing, next to them, a pointer to the function that

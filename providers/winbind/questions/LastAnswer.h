@@ -15,6 +15,9 @@
 
 namespace tessel::winbind {
 
+/// Guards every last answer of the process, also across a fork.
+std::mutex& LastAnswerLock();
+
 /// What a controller has last answered to one question in this process, for as long as none
 /// answers: a host that was told its trusted domains has not lost them because its network is down.
 /// Any thread may ask.
@@ -27,14 +30,14 @@ public:
     Answer Get(authentication::Domain const& own, Question const& ask) {
         try {
             Answer answer = ask();
-            std::lock_guard<std::mutex> const guard(_lock);
+            std::lock_guard<std::mutex> const guard(LastAnswerLock());
             _last.emplace(own, answer);
             return answer;
         } catch (Failure const& failure) {
             if (TrustStateOf(failure.Code()) != TSLAUTH_WINBIND_TRUST_NO_CONTROLLER) {
                 throw;
             }
-            std::lock_guard<std::mutex> const guard(_lock);
+            std::lock_guard<std::mutex> const guard(LastAnswerLock());
             if (!_last || _last->first != own) {
                 throw;
             }
@@ -44,7 +47,6 @@ public:
     }
 
 private:
-    std::mutex _lock;
     std::optional<std::pair<authentication::Domain, Answer>> _last;
 };
 

@@ -347,15 +347,17 @@ int GetDomainTrustState(Host const& host) {
     }
 }
 
+/// As long as any thread. Made when the library is loaded, since a fork may meet the first call.
+static LastAnswer<std::vector<Domain>>& lastTrustedDomains =
+    *std::make_unique<LastAnswer<std::vector<Domain>>>().release();
+
 std::vector<Domain> GetTrustedDomains(Host const& host) {
     Clock::time_point const deadline = Deadline();
     std::optional<Domain> const own = Joined(host);
     if (!own) {
         return {};
     }
-    static LastAnswer<std::vector<Domain>>& last =
-        *std::make_unique<LastAnswer<std::vector<Domain>>>().release(); // as long as any thread
-    return last.Get(*own, [&] {
+    return lastTrustedDomains.Get(*own, [&] {
         // A domain behind another one is nobody's trust in the directory, and known once it was
         // met.
         std::vector<Domain> const remembered = OtherDomains(WinbindClient(deadline), *own);

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include "record/Uncancelled.h"
+
 #include <tslauth/Domain.h>
 #include <tslauth/tslauth_provider.h>
 
@@ -21,6 +23,7 @@ char const* LastFailure() noexcept;
 
 /// Runs an entry that returns a code: 0, or what its failure means.
 template <typename Body> int CodeOf(char const* entry, Body&& body) noexcept {
+    Uncancelled const call;
     try {
         body();
         return TSLAUTH_PROVIDER_SUCCESS;
@@ -31,6 +34,7 @@ template <typename Body> int CodeOf(char const* entry, Body&& body) noexcept {
 
 /// Runs an entry that returns a value: the value, or `otherwise` where it fails.
 template <typename Body> int ValueOf(char const* entry, int otherwise, Body&& body) noexcept {
+    Uncancelled const call;
     try {
         return body();
     } catch (...) {

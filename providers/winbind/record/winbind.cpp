@@ -21,6 +21,10 @@ std::string TextOrEmpty(char const* text) {
     return text == nullptr ? std::string() : std::string(text);
 }
 
+/// As long as any thread. Made when the library is loaded, since a fork may meet the first call.
+LastAnswer<std::string>& lastMachineAccountDN =
+    *std::make_unique<LastAnswer<std::string>>().release();
+
 void RequireBoth(ActiveDirectoryClientCredentials const& credentials) {
     if (credentials.userName == nullptr || credentials.password == nullptr) {
         throw Failure(TSLAUTH_PROVIDER_INVALID_PARAMETER, "no user name or no password");
@@ -87,11 +91,9 @@ static int GetTrustedDomainsEntry(ActiveDirectoryClientDomain*** domains,
 
 static int GetMachineAccountDNEntry(char** name, ActiveDirectoryClientFreeFunction* release) {
     return CodeOf("get machine account DN", [&] {
-        static LastAnswer<std::string>& last =
-            *std::make_unique<LastAnswer<std::string>>().release(); // as long as any thread
-        HandOut(
-            last.Get(GetActiveDomain(ThisHost()), [] { return GetMachineAccountDN(ThisHost()); }),
-            name, release);
+        HandOut(lastMachineAccountDN.Get(GetActiveDomain(ThisHost()),
+                                         [] { return GetMachineAccountDN(ThisHost()); }),
+                name, release);
     });
 }
 

@@ -31,25 +31,23 @@ extern "C" void LockThreads();
 extern "C" void UnlockThreads();
 extern "C" void ForgetThreads();
 
-Threads& AllThreads() {
-    static Threads& threads = []() -> Threads& {
-        (void)pthread_atfork(&LockThreads, &UnlockThreads, &ForgetThreads); // without memory: as is
-        return *std::make_unique<Threads>().release();
-    }();
-    return threads;
-}
+/// Made when the library is loaded: a thread that made it in its first call could be met by a fork,
+/// and the child would wait for it for ever.
+Threads& threads = []() -> Threads& {
+    (void)pthread_atfork(&LockThreads, &UnlockThreads, &ForgetThreads); // without memory: as is
+    return *std::make_unique<Threads>().release();
+}();
 
 extern "C" void LockThreads() {
-    AllThreads().lock.lock();
+    threads.lock.lock();
 }
 
 extern "C" void UnlockThreads() {
-    AllThreads().lock.unlock();
+    threads.lock.unlock();
 }
 
 /// In a child, which has none of its parent's threads, and where this one holds the lock.
 extern "C" void ForgetThreads() {
-    Threads& threads = AllThreads();
     threads.running = 0;
     threads.abandoned = 0;
     new (&threads.changed) std::condition_variable; // nobody waits for the old one any more
@@ -75,7 +73,6 @@ void RunCall(std::shared_ptr<Call> call) {
     // What it holds goes before its caller is told, who may be waiting to see that gone.
     call->function = nullptr;
 
-    Threads& threads = AllThreads();
     std::lock_guard<std::mutex> const guard(threads.lock);
     call->failure = std::move(failure);
     call->hasEnded = true;
@@ -117,7 +114,6 @@ void BoundedCall::Wait(std::string const& what, Clock::time_point deadline,
     auto const call = std::make_shared<Call>();
     call->function = std::move(function);
 
-    Threads& threads = AllThreads();
     std::unique_lock<std::mutex> lock(threads.lock);
     if (Clock::now() >= deadline) {
         throw TimedOut(what);
@@ -161,7 +157,6 @@ void BoundedCall::Wait(std::string const& what, Clock::time_point deadline,
 }
 
 unsigned BoundedCall::Abandoned() {
-    Threads& threads = AllThreads();
     std::lock_guard<std::mutex> const guard(threads.lock);
     return threads.abandoned;
 }

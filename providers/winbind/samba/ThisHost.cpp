@@ -58,12 +58,14 @@ public:
     }
 };
 
+/// Never destroyed: a question that was abandoned may still use it. Made when the library is
+/// loaded, since a fork may meet the first call.
+Host const& machine = *new Machine;
+
 } // namespace
 
 Host const& ThisHost() {
-    // Never destroyed: a question that was abandoned may still use it.
-    static Host const& host = *new Machine;
-    return host;
+    return machine;
 }
 
 } // namespace tessel::winbind

@@ -48,6 +48,26 @@ TEST(BoundaryTest, NoExceptionEscapes) {
     EXPECT_EQ(5, ValueOf("a test", 5, []() -> int { throw 42; }));
 }
 
+TEST(BoundaryTest, AThreadThatIsCancelledInAnEntryComesToItsEnd) {
+    bool ended = false;
+    pthread_t thread;
+    auto const call = [](void* argument) -> void* {
+        (void)CodeOf("a test", [argument] {
+            (void)pthread_cancel(pthread_self());
+            pthread_testcancel();
+            *static_cast<bool*>(argument) = true;
+        });
+        pthread_testcancel(); // here it is allowed
+        *static_cast<bool*>(argument) = false;
+        return nullptr;
+    };
+    ASSERT_EQ(0, pthread_create(&thread, nullptr, call, &ended));
+    void* result = nullptr;
+    ASSERT_EQ(0, pthread_join(thread, &result));
+    EXPECT_TRUE(ended);
+    EXPECT_EQ(PTHREAD_CANCELED, result);
+}
+
 TEST(BoundaryTest, ATextIsReleasedByItself) {
     char* text = nullptr;
     ActiveDirectoryClientFreeFunction release = nullptr;
