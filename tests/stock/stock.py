@@ -8,8 +8,6 @@ import sys
 
 import pexpect
 
-HERE = os.path.dirname(os.path.realpath(__file__))
-sys.path.insert(0, os.path.join(os.path.dirname(HERE), "lab"))
 from lab import ENVIRONMENT, LOCAL_PASSWORD, TREE, Mismatch, Node, expect
 
 STATE = os.environ.get("STOCK_STATE") or os.path.join(TREE, "build/stock")

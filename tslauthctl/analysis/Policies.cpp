@@ -17,13 +17,16 @@ namespace {
 
 constexpr char PolicyFolder[] = "/etc/pam.d";
 
-/// Whether a file is what pam-auth-update, dpkg or this tool have left of a policy: no service has
-/// such a name.
+/// Whether a file is what pam-auth-update, dpkg, this tool or a person have left of a policy: no
+/// service has such a name. keep-policy goes by the same ends.
 bool IsCopy(std::string const& path) {
-    constexpr std::string_view ends[] = {".pam-old",  ".dpkg-old", ".dpkg-dist",
-                                         ".dpkg-new", ".ucf-dist", ".tslauth-orig"};
-    return std::any_of(std::begin(ends), std::end(ends),
-                       [&](std::string_view end) { return base::AsciiText::EndsWith(path, end); });
+    constexpr std::string_view ends[] = {".bak", ".orig", "~", ".pam-old", ".tslauth-orig"};
+    constexpr std::string_view packageManagers[] = {".dpkg-", ".ucf-"};
+    return std::any_of(
+               std::begin(ends), std::end(ends),
+               [&](std::string_view end) { return base::AsciiText::EndsWith(path, end); }) ||
+           std::any_of(std::begin(packageManagers), std::end(packageManagers),
+                       [&](std::string_view part) { return path.find(part) != path.npos; });
 }
 
 } // namespace
