@@ -28,8 +28,8 @@ debian_root() {
     [[ $(cat "$folder.made" 2>/dev/null) != "$wanted" ]] || return 0
     rm -rf "$folder" "$folder.made"
     mkdir -p "$folder" "$roots/archives/$suite"
-    debootstrap --variant=minbase --arch="$architecture" --cache-dir="$roots/archives/$suite" \
-        "$suite" "$folder" $(debian_mirror) || return
+    flock "$roots/archives/$suite.lock" debootstrap --variant=minbase --arch="$architecture" \
+        --cache-dir="$roots/archives/$suite" "$suite" "$folder" $(debian_mirror) || return
     # debootstrap's own way of installing knows no order of dependencies.
     in_root "$folder" apt-get -q update &&
         with_archives "$suite" "$folder" apt-get -q -y -o Dpkg::Use-Pty=0 --no-install-recommends \
@@ -38,12 +38,15 @@ debian_root() {
 }
 
 # with_archives SUITE FOLDER COMMAND...: in the root, where apt keeps what it fetches for the next
-# root.
+# root. One at a time: apt itself would not wait for another's.
 with_archives() {
-    local suite=$1
+    local archives=$roots/archives/$1
     shift
-    mkdir -p "$roots/archives/$suite/partial"
-    BIND="${BIND-} $roots/archives/$suite:/var/cache/apt/archives" in_root "$@"
+    mkdir -p "$archives/partial"
+    {
+        flock 8
+        BIND="${BIND-} $archives:/var/cache/apt/archives" in_root "$@" 8>&-
+    } 8>"$archives.lock"
 }
 
 # in_root FOLDER COMMAND...: as root in it, with the machine's network and nothing else of it but

@@ -61,7 +61,6 @@ def play(lab):
         ("the tool is purged", ("purge", "tslauthctl")),
         ("the provider is purged", ("purge", "tslauth-provider-winbind")),
         ("libpam-winbind is removed", ("remove", "libpam-winbind")),
-        ("libnss-winbind is purged", ("purge", "libnss-winbind")),
         ("winbind is removed", ("remove", "winbind")),
         ("all of Samba is purged", ("purge", "--autoremove", "samba-common", "libwbclient0")),
         ("the library is purged", ("purge", "--autoremove", "libtslauth1")),

@@ -16,7 +16,7 @@ STOCK_HOST = os.path.join(TREE, "tools/stock-host")
 PACKAGES = ("tslauth", "tslauthctl", "tslauth-provider-winbind", "libtslauth1", "libstrandctl1")
 POLICY = "/etc/pam.d/system-auth-generic"
 SSH_OPTIONS = ("-o", "StrictHostKeyChecking=no", "-o", "UserKnownHostsFile=/dev/null",
-               "-o", "LogLevel=ERROR", "-o", "ConnectTimeout=20", "-o", "NumberOfPasswordPrompts=1")
+               "-o", "ConnectTimeout=20", "-o", "NumberOfPasswordPrompts=1")
 
 
 class StockHost(Node):
@@ -200,6 +200,12 @@ class StockHost(Node):
         """Ready for the first activation."""
         self.tslauthctl("setup", "--provider", "winbind")
 
+    def ask(self, *arguments, code=None, user="root"):
+        """What the tool does, and its document; with a code, it must end with that."""
+        result = self.run("runuser", "-u", user, "--", "tslauthctl", "--json", *arguments)
+        expect(result.out.startswith("{") and code in (None, result.code), str(result))
+        return result, json.loads(result.out)
+
     def follows(self):
         """The services ask the policy, and Debian's own winbind profile is off."""
         for kind in ("auth", "account", "password", "session", "session-noninteractive"):
@@ -218,9 +224,8 @@ class StockHost(Node):
         self.tslauthctl("activate", store)
 
     def store(self):
-        """What is recorded; None where nothing is."""
-        result = self.run("tslauthctl", "--json", "status")
-        return json.loads(result.out).get("recorded") if result.out else None
+        """What is recorded."""
+        return self.ask("status")[1]["recorded"]
 
     def is_active(self):
         """The provider's entries are in the policy and in the name-service switch."""

@@ -21,6 +21,7 @@ using namespace authentication;
 using namespace meaning;
 
 constexpr char SambaModule[] = "pam_winbind.so";
+constexpr char SambaService[] = "winbind";
 
 std::string BaseName(std::string const& path) {
     return path.substr(path.rfind('/') + 1);
@@ -118,6 +119,18 @@ void AddSambaProfile(HostFacts const& facts, std::vector<Finding>& findings) {
     }
 }
 
+/// Debian's package of it puts it in whenever it is installed. It knows nothing of local names.
+void AddSambaService(HostFacts const& facts, std::vector<Finding>& findings) {
+    bool const own = facts.configured && facts.configured->nss.module() == SambaService;
+    if (!own && facts.nameServices &&
+        AsksService(*facts.nameServices, ReadNSSServices(SambaService))) {
+        findings.push_back({"samba-service",
+                            std::string(Paths::NSSConfiguration) + " asks Samba's service '" +
+                                SambaService + "' itself, beside the provider's",
+                            "tslauthctl setup"});
+    }
+}
+
 void AddMembership(HostFacts const& facts, std::vector<Finding>& findings) {
     if (facts.wanted && facts.joined == false) {
         findings.push_back({"not-joined",
@@ -144,6 +157,7 @@ std::vector<Finding> FindingsOf(HostFacts const& facts) {
     if (facts.wanted) {
         AddServices(facts, findings);
         AddSambaProfile(facts, findings);
+        AddSambaService(facts, findings);
         for (auto const& module : facts.missingModules) {
             findings.push_back({"module-missing", module, ""});
         }

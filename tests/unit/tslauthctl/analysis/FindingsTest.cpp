@@ -80,6 +80,14 @@ TEST(FindingsTest, WhatKeepsTheDomainsUsersOutHasAWordEach) {
     EXPECT_THAT(WordsOf(facts), IsEmpty()) << "which nobody wants to log in";
 }
 
+TEST(FindingsTest, SambasOwnServiceIsFoundBesideTheProviders) {
+    auto facts = InOrder();
+    facts.nameServices = "passwd: prov files winbind\n";
+    EXPECT_THAT(WordsOf(facts), ElementsAre("samba-service"));
+    facts.configured = MakeProviderEntries("pam_prov.so", {}, "winbind", {});
+    EXPECT_THAT(WordsOf(facts), IsEmpty()) << "of which it is the provider's own";
+}
+
 TEST(FindingsTest, TheTrustAndWhatWasNotLookedAtAreTold) {
     auto facts = InOrder();
     facts.trustState = 0;
