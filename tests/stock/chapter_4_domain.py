@@ -2,6 +2,7 @@
 """The main path: from a stock host to a domain user's session, and back."""
 import outage
 from lab import LOCAL_PASSWORD, PASSWORD, differences, expect, expect_equal, until
+from scenario_8_accounts import make_anew
 from stock import POLICY, StockHost
 
 TITLE = "Debian 12: from a stock host to a domain user's session, and back"
@@ -28,19 +29,16 @@ def give_key(host, user):
     """A key of a user of the domain, who may have no home yet."""
     host.shell("""
         key=/root/domain
-        [ -e "$key" ] || ssh-keygen -q -t ed25519 -N '' -f "$key"
-        echo 'AuthorizedKeysFile .ssh/authorized_keys /etc/ssh/keys/%u' \\
-            >/etc/ssh/sshd_config.d/keys.conf
-        install -d -m 0755 /etc/ssh/keys
+        if [ ! -e "$key" ]; then
+            ssh-keygen -q -t ed25519 -N '' -f "$key"
+            install -d -m 0755 /etc/ssh/keys
+            echo 'AuthorizedKeysFile .ssh/authorized_keys /etc/ssh/keys/%u' \\
+                >/etc/ssh/sshd_config.d/keys.conf
+            systemctl restart ssh
+        fi
         install -m 0644 "$key.pub" "/etc/ssh/keys/$1"
-        systemctl reload ssh
-        until { : </dev/tcp/localhost/22; } 2>/dev/null; do sleep 0.1; done""", user)
+        """, user)
     return "/root/domain"
-
-
-def make_double(lab, name):
-    """A user of the domain who is called like a local one."""
-    lab.dc1.samba_tool("user", "create", name, PASSWORD)
 
 
 def main_path(lab, host):
@@ -76,7 +74,9 @@ def main_path(lab, host):
 
 def lock(lab, host, name):
     """Three wrong passwords; the domain's other users have as many as they want."""
-    lab.dc1.samba_tool("user", "create", name, PASSWORD)
+    make_anew(lab.dc1, "user", name, PASSWORD)
+    lab.dc1.run("/usr/bin/python3", "/usr/bin/samba-tool", "domain", "passwordsettings", "pso",
+                "delete", "strict")
     lab.dc1.samba_tool("domain", "passwordsettings", "pso", "create", "strict", "1",
                        "--account-lockout-threshold=3")
     lab.dc1.samba_tool("domain", "passwordsettings", "pso", "apply", "strict", name)
@@ -94,13 +94,15 @@ def closed_accounts(lab, host):
             refused(host, user, PASSWORD)
         with lab.step(f"{user} is refused with a key, and told why"):
             refused(host, user, key=give_key(host, user), told=told)
-    with lab.step("CORP\\mustchange1 changes the password on the console, and logs in with it"):
-        changes_at_log_in(host, "CORP\\mustchange1", PASSWORD, "Another-Passw0rd")
-        let_in(host, "CORP\\mustchange1", "Another-Passw0rd")
-    with lab.step("CORP\\user1 changes the password with passwd(1), and back"):
-        changes_with_passwd(host, USER, PASSWORD, "Another-Passw0rd")
-        let_in(host, USER, "Another-Passw0rd")
-        lab.dc1.samba_tool("user", "setpassword", "user1", f"--newpassword={PASSWORD}")
+    make_anew(lab.dc1, "user", "change1", PASSWORD, "--must-change-at-next-login")
+    with lab.step("CORP\\change1, who must, changes the password on the console, and logs in"):
+        changes_at_log_in(host, "CORP\\change1", PASSWORD, "Another-Passw0rd")
+        let_in(host, "CORP\\change1", "Another-Passw0rd")
+    with lab.step("CORP\\change1 changes it again with passwd(1)"):
+        lab.dc1.samba_tool("domain", "passwordsettings", "set", "--min-pwd-age=0")
+        changes_with_passwd(host, "CORP\\change1", "Another-Passw0rd", "Yet-Another-Passw0rd")
+        let_in(host, "CORP\\change1", "Yet-Another-Passw0rd")
+        refused(host, "CORP\\change1", "Another-Passw0rd")
 
 
 def changes_at_log_in(host, user, old, new):
@@ -124,7 +126,8 @@ def changes_with_passwd(host, user, old, new):
         expect(terminal.expect([r"(?i)password: ?$", "(?i)\n.*(failure|error)"]) == 0,
                f"passwd: {terminal.before}")
         terminal.sendline(answer)
-    expect(terminal.expect(["(?i)success|changed", "(?i)error|fail"]) == 0, terminal.before)
+    expect(terminal.expect(["updated successfully", "(?i)error|fail|unchanged"]) == 0,
+           terminal.before)
     terminal.close(force=True)
 
 
@@ -148,7 +151,7 @@ def who_may_log_in(lab, host):
     with lab.step("a second time nothing has to be changed"):
         expect("Nothing had to be changed" in host.tslauthctl("permit", USER).out, "it changed")
     with lab.step("a group whose name has a blank is permitted"):
-        lab.dc1.samba_tool("group", "add", "door keepers")
+        make_anew(lab.dc1, "group", "door keepers")
         lab.dc1.samba_tool("group", "addmembers", "door keepers", "plain1")
         host.run("wbinfo", "--authenticate", f"{plain}%{PASSWORD}")
         host.tslauthctl("permit", "CORP\\door keepers")
@@ -199,8 +202,7 @@ def membership(lab, host):
                          str(result))
         finally:
             lab.dc1.samba_tool("user", "enable", account)
-    with lab.step("a job of CORP\\user1 runs from cron"):
-        host.write("/etc/cron.d/domain", "* * * * * CORP\\user1 id -un >/tmp/job\n")
+    with lab.step("a job of CORP\\user1 has run from cron"):
         until("the job has run", lambda: host.run("test", "-s", "/tmp/job").code == 0, seconds=90)
         expect_equal(host.read("/tmp/job").strip().lower(), USER.lower(), "who ran it")
         host.ok("rm", "/etc/cron.d/domain")
@@ -214,6 +216,7 @@ def play(lab):
     main_path(lab, host)
     with lab.step("CORP\\user1 logs in with a key"):
         let_in(host, USER, key=give_key(host, USER))
+    host.write("/etc/cron.d/domain", "* * * * * CORP\\user1 id -un >/tmp/job\n")
     with lab.step("on the console"):
         entered, seen = host.logs_in(USER, PASSWORD)
         expect(entered, seen)
@@ -234,7 +237,7 @@ def play(lab):
     membership(lab, host)
     for name in ("root", "lena"):
         with lab.step(f"the domain has a user {name} too: he never becomes the host's {name}"):
-            make_double(lab, name)
+            make_anew(lab.dc1, "user", name, PASSWORD)
             entered, seen = host.becomes("lena", name, PASSWORD)
             expect(not entered, seen)
             entered, seen = host.logs_in(name, PASSWORD)
@@ -286,9 +289,13 @@ def play(lab):
         host.purge()
         host.locals_are_well()
         refused(host, USER, PASSWORD)
-    with lab.step("policies, name-service switch and services are byte for byte what they were"):
+    with lab.step("every file that says who may log in is byte for byte what it was"):
         left = {path: what for path, what in differences(before, host.etc()).items()
                 if path.startswith(("/etc/pam.d/", "/etc/nsswitch", "/etc/tessel", "/etc/security",
-                                    "/etc/hosts", "/etc/resolv.conf", "/etc/krb5"))}
+                                    "/etc/resolv.conf", "/etc/krb5"))}
         expect(not left, f"{left}\n" + host.difference("before", *left))
+    with lab.step("of the hosts file a line is left, for the address by which the host joined"):
+        left = [line for line in host.difference("before", "/etc/hosts").splitlines()[2:]
+                if line[0] in "+-"]
+        expect(len(left) == 1 and left[0].endswith("domain.corp.example domain"), str(left))
     host.down()

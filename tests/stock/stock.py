@@ -25,6 +25,7 @@ class StockHost(Node):
     def __init__(self, name, release=12):  # pylint: disable=super-init-not-called
         self.name = name
         self.release = release
+        self.down()  # of a run that was interrupted
         subprocess.run([STOCK_HOST, "up", "--release", str(release), name], check=True,
                        stdout=sys.stderr)
         with open(f"{STATE}/{name}/pid", encoding="ascii") as file:

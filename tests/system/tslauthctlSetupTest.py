@@ -23,6 +23,8 @@ SERVICE = "setup-test"
 DIRECT = "setup-test-direct"
 USER = "CORP\\Ann Lee"
 GROUP = "CORP\\domain users"
+# A group that winbindd tells of as of a user as well.
+KEEPERS = "CORP\\door keepers"
 
 STOCK_NSS = """# /etc/nsswitch.conf
 
@@ -89,8 +91,9 @@ def populate():
     extra.mkdir(exist_ok=True)
     (extra / "passwd").write_text(
         f"{USER}:*:7001:7001::/home/CORP/ann:/bin/bash\n"
-        "CORP\\other:*:7002:7001::/home/other:/bin/sh\n")
-    (extra / "group").write_text(f"{GROUP}:x:7001:\n")
+        "CORP\\other:*:7002:7001::/home/other:/bin/sh\n"
+        f"{KEEPERS}:*:7003:7003::/home/CORP/keepers:/bin/sh\n")
+    (extra / "group").write_text(f"{GROUP}:x:7001:\n{KEEPERS}:x:7003:\n")
 
 
 def leave_stock_host():
@@ -101,6 +104,14 @@ def leave_stock_host():
     NSS.write_text(STOCK_NSS)
     pathlib.Path("/run/asked").unlink(missing_ok=True)
     play_domain("in-order")
+
+
+def removal_script():
+    """As debian/rules makes it."""
+    keep = (TREE / "etc/keep-policy").read_text()
+    included = keep[keep.index("included() {"):]
+    included = included[:included.index("\n}\n") + len("\n}\n")]
+    return (TREE / "debian/tslauthctl.postrm").read_text().replace("#INCLUDED#", included)
 
 
 def etc():
@@ -172,6 +183,9 @@ class SetupTest(unittest.TestCase):
         self.assertEqual(document["exit"], DONE, document)
         self.assertEqual([finding["word"] for finding in document["findings"]], [])
 
+    def words(self):
+        return [finding["word"] for finding in ask("status")["findings"]]
+
     def test_status_passes_over_copies_of_policies(self):
         self.set_up_and_activate()
         copy = pathlib.Path("/etc/pam.d/common-auth.pam-old")
@@ -202,6 +216,15 @@ class SetupTest(unittest.TestCase):
         self.assertFalse(LINK.exists())
         self.assertFalse(STATE.exists())
         self.assertIn("pam_winbind.so", pathlib.Path("/etc/pam.d/common-auth").read_text())
+        self.assertEqual(ask("unsetup")["exit"], DONE)
+        self.assertEqual(etc(), self.before)
+
+    def test_a_setup_that_mends_an_active_host_is_undone_like_the_first_one(self):
+        self.set_up_and_activate()
+        NSS.write_text(NSS.read_text().replace("extrausers", "extrausers winbind"))
+        self.assertIn("samba-service", self.words())
+        self.set_up()
+        self.assertNotIn("samba-service", self.words())
         self.assertEqual(ask("unsetup")["exit"], DONE)
         self.assertEqual(etc(), self.before)
 
@@ -250,7 +273,7 @@ class SetupTest(unittest.TestCase):
             self.assertEqual(ask("unsetup")["exit"], LOSS)
             if not included:
                 direct.unlink()
-            purge = subprocess.run(["sh", TREE / "debian/tslauthctl.postrm", "purge"], check=True,
+            purge = subprocess.run(["sh", "-c", removal_script(), "postrm", "purge"], check=True,
                                    text=True, stderr=subprocess.PIPE)
             self.assertEqual((PAM.exists(), f"{PAM} stays" in purge.stderr), (included, included))
 
@@ -432,6 +455,11 @@ class SetupTest(unittest.TestCase):
         self.assertFalse(listed["by_default"])
         self.assertEqual(ask("permit", "--all", "--trusted")["exit"], DONE)
         self.assertTrue(ask("permit", "--list")["by_default"])
+
+    def test_a_group_that_is_told_of_as_a_user_too_is_permitted_as_a_group(self):
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", KEEPERS)["exit"], DONE)
+        self.assertIn(f"+:({KEEPERS}):ALL\n", ACCESS.read_text())
 
     def test_without_setup_nobody_is_permitted(self):
         self.assertEqual(ask("permit", "--force", USER)["exit"], REFUSED)

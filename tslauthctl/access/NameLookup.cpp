@@ -17,25 +17,39 @@ constexpr std::size_t firstRoom = 4096;
 constexpr std::size_t mostRoom = std::size_t(64) << 20;
 
 /// @param get getpwnam_r or getgrnam_r
-template <typename Entry, typename Get>
-std::optional<std::string> Find(std::string const& name, Get get, char* Entry::*field) {
+/// @param take called with the entry, where there is one
+template <typename Entry, typename Get, typename Take>
+void Find(std::string const& name, Get get, Take take) {
     for (std::size_t room = firstRoom; room <= mostRoom; room *= 4) {
         std::vector<char> buffer(room);
         Entry entry = {};
         Entry* found = nullptr;
         int const error = get(name.c_str(), &entry, buffer.data(), buffer.size(), &found);
         if (error != ERANGE) {
-            return found ? std::optional<std::string>(found->*field) : std::nullopt;
+            if (found) {
+                take(*found);
+            }
+            return;
         }
     }
-    return std::nullopt;
 }
 
 } // namespace
 
 KnownNames LookUpName(std::string const& name) {
-    return {Find<passwd>(name, getpwnam_r, &passwd::pw_name),
-            Find<group>(name, getgrnam_r, &group::gr_name)};
+    KnownNames known;
+    std::optional<gid_t> ownGroup;
+    Find<passwd>(name, getpwnam_r, [&](passwd const& user) {
+        known.user = user.pw_name;
+        if (user.pw_uid == user.pw_gid) {
+            ownGroup = user.pw_gid;
+        }
+    });
+    Find<group>(name, getgrnam_r, [&](group const& group) {
+        known.group = group.gr_name;
+        known.userIsGroup = ownGroup == group.gr_gid;
+    });
+    return known;
 }
 
 bool HasUser(std::string_view passwd, std::string_view name) {

@@ -13,6 +13,9 @@ struct KnownNames {
     /// As the name service has it; nothing where there is no such user.
     std::optional<std::string> user;
     std::optional<std::string> group;
+    /// Whether the user may be nobody but the group: a directory whose users and groups share their
+    /// numbers, such as winbindd's, gives a group an entry of a user as well.
+    bool userIsGroup = false;
 };
 
 /// Asks the name service, and with it the domain; blocks for as long as that takes.

@@ -54,7 +54,9 @@ Subject Resolved(std::string const& typed, AccessArguments const& arguments, Lim
                                                  "' is a user of this host itself, whom the rules "
                                                  "do not concern");
         }
-        return {*known.user, false};
+        if (!known.userIsGroup) {
+            return {*known.user, false};
+        }
     }
     if (known.group) {
         return {*known.group, true};

@@ -62,6 +62,7 @@ void SayWhatElse(SetupPlan const& plan, Console& console) {
 /// Remembers everything that the plan is going to change.
 SetupRecord RecordFor(SetupPlan const& plan, SetupFacts const& facts) {
     auto record = ReadSetupRecord().value_or(SetupRecord());
+    bool const again = record.provider == facts.provider;
     record.provider = facts.provider;
     auto const addFolders = [&](std::string const& path) {
         for (auto& folder : MissingFolders(path)) {
@@ -72,7 +73,9 @@ SetupRecord RecordFor(SetupPlan const& plan, SetupFacts const& facts) {
         }
     };
     for (auto const& file : plan.files) {
-        if (file.Changes()) {
+        // What has come into the switch since it was set up is nothing that the host was before.
+        bool const mended = again && file.path == Paths::NSSConfiguration;
+        if (file.Changes() && !mended) {
             record.Add(file.path, file.before, file.after);
             addFolders(file.path);
         }
