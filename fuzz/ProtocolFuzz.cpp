@@ -45,12 +45,10 @@ template <typename Read> void Try(Read read) {
 void TryDomain(std::string_view answer) {
     Try([&] {
         DomainInformation const information = ReadDomainAnswer(answer);
-        std::string const again = nlohmann::json({{"version", 1},
-                                                  {"netbios", information.netBIOSName},
+        std::string const again = nlohmann::json({{"netbios", information.netBIOSName},
                                                   {"dns", information.dnsName},
                                                   {"sid", information.sid}})
-                                      .dump() +
-                                  "\n\n";
+                                      .dump();
         DomainInformation const second = ReadDomainAnswer(again);
         Expect("the NetBIOS name is kept", second.netBIOSName, information.netBIOSName);
         Expect("the DNS name is kept", second.dnsName, information.dnsName);
@@ -66,11 +64,16 @@ void TryAccount(std::string_view answer) {
         MachineAccount const account = ReadAccountAnswer(answer);
         ExpectPrintable(View(account.blob));
         ExpectPrintable(account.controller);
-        std::string const blob(View(account.blob));
-        Expect("the blob is the second line",
-               std::string(answer.substr(answer.find('\n') + 1, blob.size())), blob);
+        ExpectPrintable(account.claim);
+        std::string const again = nlohmann::json({{"controller", account.controller},
+                                                  {"blob", std::string(View(account.blob))},
+                                                  {"claim", account.claim}})
+                                      .dump();
+        MachineAccount const second = ReadAccountAnswer(again);
+        Expect("the blob is kept", std::string(View(second.blob)), std::string(View(account.blob)));
+        Expect("the controller is kept", second.controller, account.controller);
+        Expect("the claim is kept", second.claim, account.claim);
     });
-    (void)IsCodeSpent(answer); // it must come back
 }
 
 } // namespace

@@ -28,8 +28,9 @@ become_root() {
 
 # What every program of this folder needs to build the library and to make a node or a lab of them.
 readonly build_packages=(
-    cmake ninja-build g++ pkg-config libboost-dev libssl-dev libcli11-dev nlohmann-json3-dev
-    libdtl-dev libwbclient-dev libpam0g-dev libc6-dev iproute2 util-linux passwd procps python3
+    cmake ninja-build g++ pkg-config libboost-dev libcurl4-openssl-dev libssl-dev libcli11-dev
+    nlohmann-json3-dev libdtl-dev libwbclient-dev libpam0g-dev libc6-dev iproute2 util-linux
+    passwd procps python3
 )
 # What shows that the log-in is real: a PAM and a name-service module, and a client of each library.
 readonly login_packages=(
@@ -37,8 +38,16 @@ readonly login_packages=(
     diffutils
 )
 
+# What runs the CAM service.
+readonly service_packages=(
+    openssl python3-aiohttp python3-alembic python3-jinja2 python3-prometheus-client
+    python3-psycopg2 python3-sqlalchemy util-linux
+)
+
 # What the tests need beyond those.
-readonly test_packages=(googletest python3-jsonschema patch binutils)
+readonly test_packages=(
+    googletest python3-jsonschema patch binutils "${service_packages[@]}"
+)
 
 missing_packages() {
     local -A installed=()

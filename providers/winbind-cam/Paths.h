@@ -13,6 +13,9 @@ inline constexpr char OneTimeCode[] = "/etc/tessel/tslauth/winbind-cam.code";
 /// system's.
 inline constexpr char Authorities[] = "/etc/tessel/tslauth/winbind-cam-ca.pem";
 
+/// Which installation this is: made anew where an image becomes a host.
+inline constexpr char Machine[] = "/etc/machine-id";
+
 /// Where tslauth-cam-service listens: a server is known by its address alone.
 inline constexpr std::uint16_t Port = 8989;
 

@@ -5,7 +5,13 @@
 #include "Codes.h"
 
 #include <algorithm>
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <map>
 #include <nlohmann/json.hpp>
+#include <openssl/sha.h>
+#include <vector>
 
 namespace tessel::winbind::cam {
 
@@ -13,12 +19,16 @@ namespace {
 
 using Json = nlohmann::json;
 
-constexpr int Version = 1;
+/// What comes from the service may be a secret: what the parser takes apart is wiped, too.
+using SecretString = std::basic_string<char, std::char_traits<char>, WipingAllocator<char>>;
+using Answer = nlohmann::basic_json<std::map, std::vector, SecretString, bool, std::int64_t,
+                                    std::uint64_t, double, WipingAllocator>;
 
 /// The longest names that a domain and a host can have.
 constexpr std::size_t NetBIOSLimit = 15;
 constexpr std::size_t DNSLimit = 253;
 constexpr std::size_t SIDLimit = 184;
+constexpr std::size_t ClaimLimit = 64;
 
 struct Refusal {
     char const* error;
@@ -38,6 +48,8 @@ constexpr Refusal Refusals[] = {
     {"no-such-unit", Codes::InvalidParameter,
      "the domain has no such organisational unit, or the service may not use it"},
     {"bad-request", Codes::InvalidParameter, "the service does not understand the request"},
+    {"busy", Codes::ServiceFailed,
+     "the service is making this account already, or has too many to make; try again later"},
     {"failed", Codes::ServiceFailed, "the service could not answer; its log tells why"},
 };
 
@@ -57,115 +69,126 @@ bool IsMadeOf(std::string_view text, std::string_view others, std::size_t limit)
     throw Failure(Codes::InvalidAnswer, "the service's answer " + what);
 }
 
-/// Without its end; empty where there is no such line.
-std::string_view Line(std::string_view answer, bool isSecond) {
-    std::size_t const end = answer.find('\n');
-    if (end == std::string_view::npos) {
-        return {};
-    }
-    if (!isSecond) {
-        return answer.substr(0, end);
-    }
-    answer.remove_prefix(end + 1);
-    return answer.substr(0, answer.find('\n'));
-}
-
-/// @return the object, or null
-Json Parsed(std::string_view answer) {
-    std::string_view const line = Line(answer, false);
-    Json json = Json::parse(line.begin(), line.end(), nullptr, false);
-    auto const isOurs = [&] {
-        auto const version = json.find("version");
-        return version != json.end() && version->is_number_integer() && *version == Version;
-    };
-    return json.is_object() && isOurs() ? json : Json();
-}
-
 /// The object of an answer that is no refusal.
-Json Granted(std::string_view answer) {
-    Json json = Parsed(answer);
-    if (json.is_null()) {
+Answer Granted(std::string_view text) {
+    Answer answer = Answer::parse(text.begin(), text.end(), nullptr, false);
+    if (!answer.is_object()) {
         FailAnswer("is none that is known");
     }
-    auto const error = json.find("error");
-    if (error == json.end()) {
-        return json;
+    auto const error = answer.find("error");
+    if (error == answer.end()) {
+        return answer;
     }
     for (Refusal const& refusal : Refusals) {
-        if (*error == refusal.error) {
+        if (error->is_string() && error->get_ref<SecretString const&>() == refusal.error) {
             throw Failure(refusal.code, refusal.text);
         }
     }
     FailAnswer("is an error that is not known");
 }
 
-/// A name that may be printed, logged and handed on as it is.
-std::string Name(Json const& json, char const* key, std::string_view others, std::size_t limit) {
-    auto const value = json.find(key);
-    if (value == json.end() || !value->is_string()) {
+/// A member that may be handed on as it is.
+SecretString const& Member(Answer const& answer, char const* key, std::string_view others,
+                           std::size_t limit) {
+    auto const value = answer.find(key);
+    if (value == answer.end() || !value->is_string()) {
         FailAnswer(std::string("lacks '") + key + "'");
     }
-    auto name = value->get<std::string>();
-    if (!IsMadeOf(name, others, limit)) {
+    auto const& text = value->get_ref<SecretString const&>();
+    if (!IsMadeOf({text.data(), text.size()}, others, limit)) {
         FailAnswer(std::string("holds a '") + key + "' that is none");
     }
-    return name;
+    return text;
 }
 
-std::string RequestText(Json const& json) {
-    return json.dump() + '\n';
+/// A name that may be printed and logged as well.
+std::string Name(Answer const& answer, char const* key, std::string_view others,
+                 std::size_t limit) {
+    SecretString const& text = Member(answer, key, others, limit);
+    return {text.data(), text.size()};
+}
+
+void Append(SecretText& text, std::string_view more) {
+    text.insert(text.end(), more.begin(), more.end());
 }
 
 } // namespace
 
-std::string DomainRequest() {
-    return RequestText({{"version", Version}, {"request", "domain"}});
+std::string HostKey(std::string_view machine, std::string_view code) {
+    constexpr std::string_view purpose = "tslauth-cam host key";
+    SecretText text;
+    text.reserve(purpose.size() + machine.size() + code.size() + 2);
+    for (std::string_view const part : {purpose, machine, code}) {
+        Append(text, part);
+        text.push_back('\0');
+    }
+    std::array<unsigned char, SHA256_DIGEST_LENGTH> digest = {};
+    SHA256(reinterpret_cast<unsigned char const*>(text.data()), text.size(), digest.data());
+    std::string key;
+    for (unsigned char const byte : digest) {
+        constexpr char digits[] = "0123456789abcdef";
+        key += digits[byte >> 4U];
+        key += digits[byte & 15U];
+    }
+    return key;
 }
 
-std::string AccountRequest(std::string const& account, char const* unit) {
+void RequireHostName(std::string const& account) {
     if (!IsMadeOf(account, "-", NetBIOSLimit) || account.front() == '-' || account.back() == '-') {
         throw Failure(Codes::InvalidComputerName,
                       "'" + account +
                           "' cannot be a machine account: at most 15 letters, digits and hyphens");
     }
-    Json request = {{"version", Version}, {"request", "account"}, {"account", account}};
+}
+
+SecretText AccountRequest(std::string const& account, char const* unit, std::string_view code,
+                          std::string const& hostKey) {
+    Json request = {{"host", account}, {"host_key", hostKey}};
     if (unit != nullptr) {
         request["unit"] = unit;
     }
+    std::string open;
     try {
-        return RequestText(request);
+        open = request.dump();
     } catch (Json::exception const&) {
         throw Failure(Codes::InvalidParameter, "the organisational unit is no text in UTF-8");
     }
+    open.pop_back(); // the brace: the code comes in without a copy that nobody wipes
+    constexpr std::string_view member = ",\"code\":\"";
+    SecretText text;
+    text.reserve(open.size() + member.size() + code.size() + 2);
+    for (std::string_view const part : {std::string_view(open), member, code}) {
+        Append(text, part);
+    }
+    Append(text, "\"}");
+    return text;
+}
+
+SecretText ReceivedRequest(std::string const& claim) {
+    SecretText text;
+    Append(text, Json({{"claim", claim}}).dump());
+    return text;
 }
 
 DomainInformation ReadDomainAnswer(std::string_view answer) {
-    Json const json = Granted(answer);
+    Answer const granted = Granted(answer);
     DomainInformation information;
     // A NetBIOS name may have more characters than a host's.
-    information.netBIOSName = Name(json, "netbios", "-_.!@#$%^&'(){}~", NetBIOSLimit);
-    information.dnsName = Name(json, "dns", "-_.", DNSLimit);
-    information.sid = Name(json, "sid", "-", SIDLimit);
+    information.netBIOSName = Name(granted, "netbios", "-_.!@#$%^&'(){}~", NetBIOSLimit);
+    information.dnsName = Name(granted, "dns", "-_.", DNSLimit);
+    information.sid = Name(granted, "sid", "-", SIDLimit);
     if (information.sid.compare(0, 4, "S-1-") != 0) {
         FailAnswer("holds a 'sid' that is none");
     }
     return information;
 }
 
-bool IsCodeSpent(std::string_view answer) {
-    Json const json = Parsed(answer);
-    auto const spent = json.find("spent");
-    return spent != json.end() && *spent == true;
-}
-
 MachineAccount ReadAccountAnswer(std::string_view answer) {
-    Json const json = Granted(answer);
+    Answer const granted = Granted(answer);
     MachineAccount account;
-    account.controller = Name(json, "controller", "-_.", DNSLimit);
-    std::string_view const blob = Line(answer, true);
-    if (!IsMadeOf(blob, "+/=", MaximumAnswer)) {
-        FailAnswer("holds no blob");
-    }
+    account.controller = Name(granted, "controller", "-_.", DNSLimit);
+    account.claim = Name(granted, "claim", "-", ClaimLimit);
+    SecretString const& blob = Member(granted, "blob", "+/=", answer.size());
     account.blob.assign(blob.begin(), blob.end());
     return account;
 }

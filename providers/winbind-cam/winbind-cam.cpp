@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "../winbind/Failure.h"
 #include "Codes.h"
+#include "HttpsClient.h"
 #include "OneTimeCode.h"
 #include "Paths.h"
 #include "Protocol.h"
-#include "TlsConnection.h"
 #include "join/DomainJoin.h"
 #include "record/Uncancelled.h"
 #include "samba/ThisHost.h"
@@ -12,8 +12,10 @@
 #include <tslauth/tslauth_cam_provider.h>
 
 #include <chrono>
-#include <initializer_list>
+#include <fstream>
 #include <new>
+#include <random>
+#include <string>
 #include <string_view>
 #include <syslog.h>
 
@@ -43,13 +45,18 @@ void ForgetResults() {
     }
 }
 
-SecretText Ask(char const* server, Trust const& trust, std::chrono::seconds limit,
-               std::initializer_list<std::string_view> request) {
-    TlsConnection connection(server, Paths::Port, trust, Deadline::clock::now() + limit);
-    for (std::string_view const part : request) {
-        connection.Send(part);
+/// What the machine is known by to itself. Where it is known by nothing, another text each time:
+/// the service then cannot find an account again.
+std::string Machine() {
+    std::string machine;
+    std::getline(std::ifstream(Paths::Machine), machine);
+    if (machine.empty()) {
+        std::random_device random;
+        for (int i = 0; i < 4; ++i) {
+            machine += std::to_string(random()) + "-";
+        }
     }
-    return connection.ReceiveTwoLines(MaximumAnswer);
+    return machine;
 }
 
 /// A code that stays behind is worth nothing any more: no reason to fail for.
@@ -61,6 +68,15 @@ void Spend(OneTimeCode const& code) {
     }
 }
 
+/// The service waits for it, for a while: nothing is lost where it does not arrive.
+void TellThatItCame(HttpsClient& client, MachineAccount const& account) {
+    try {
+        (void)client.Post(ReceivedPath, ReceivedRequest(account.claim)); // an empty answer
+    } catch (Failure const& failure) {
+        syslog(LOG_WARNING, "winbind-cam: %s, ignoring: the account has come", failure.what());
+    }
+}
+
 void CreateAccount(char const* server, Trust const& trust, char const* accountName,
                    char const* organisationalUnit, char** firstResult, char** secondResult) {
     if (!trust.IsKnown()) {
@@ -69,17 +85,18 @@ void CreateAccount(char const* server, Trust const& trust, char const* accountNa
                       std::string("nothing is pinned for ") + server +
                           " and certificates are not verified: it gets no one-time code");
     }
-    std::string const request = AccountRequest(accountName, organisationalUnit);
+    RequireHostName(accountName);
     // The provider `winbind` would refuse later, with the code spent and the account made anew:
     // that of a host that is joined would be broken by it.
     DomainJoin::RequireJoinable(ThisHost());
     OneTimeCode const code(Paths::OneTimeCode);
     SecretText const text = code.Read();
-    SecretText const answer = Ask(server, trust, AccountLimit, {request, View(text), "\n"});
-    if (IsCodeSpent(View(answer))) {
-        Spend(code);
-    }
-    MachineAccount const account = ReadAccountAnswer(View(answer));
+    SecretText const request =
+        AccountRequest(accountName, organisationalUnit, View(text), HostKey(Machine(), View(text)));
+    HttpsClient client(server, Paths::Port, trust, Deadline::clock::now() + AccountLimit);
+    MachineAccount const account = ReadAccountAnswer(View(client.Post(AccountPath, request)));
+    Spend(code);
+    TellThatItCame(client, account);
     *firstResult = HandOut(results[0], View(account.blob));
     *secondResult = HandOut(results[1], account.controller);
 }
@@ -107,8 +124,8 @@ int GetDomainInformation(char const* server, int verifyCertificate, char const* 
     return Guarded("get domain information", [&] {
         // Which domain a server claims to serve is asked before it is trusted, too.
         Trust const trust = {verifyCertificate != 0, thumbprint, Paths::Authorities};
-        SecretText const answer = Ask(server, trust, DomainLimit, {DomainRequest(), "\n"});
-        DomainInformation const information = ReadDomainAnswer(View(answer));
+        HttpsClient client(server, Paths::Port, trust, Deadline::clock::now() + DomainLimit);
+        DomainInformation const information = ReadDomainAnswer(View(client.Get(DomainPath)));
         *netBIOSDomainName = HandOut(results[0], information.netBIOSName);
         *dnsDomainName = HandOut(results[1], information.dnsName);
         *domainSID = HandOut(results[2], information.sid);

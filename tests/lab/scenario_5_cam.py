@@ -11,6 +11,7 @@ from lab import LogIn, PASSWORD, TREE, expect, expect_equal, until
 TITLE = "Joining without credentials on the host, through the CAM service"
 
 SERVICE = f"{TREE}/cam-service/tslauth-cam-service"
+CONFIGURATION = "/run/cam/service.toml"
 SERVER, IMPOSTOR = "10.99.0.1", "10.99.0.2"
 # The account that the service makes accounts with: no user of the lab has its password.
 SERVICE_USER, SERVICE_PASSWORD = "cam-service", "Only-the-serv1ce-has-it"
@@ -73,11 +74,20 @@ def start_service(dc1):
     """The process, whose output is the service's log."""
     log = "/run/cam/log"
     dc1.write(log, "")
+    dc1.write(CONFIGURATION, """
+state = "/run/cam/state"
+[server]
+certificate = "/run/cam/service.pem"
+key = "/run/cam/service.key"
+[domain]
+controller = "dc1.corp.example"
+credentials = "/run/cam-account/credentials"
+default_unit = "Servers/Linux"
+""")
+    dc1.ok(SERVICE, "check", "--configuration", CONFIGURATION)
     process = dc1.start(
         "bash", "-c", f'exec "$0" "$@" >>{log} 2>&1', SERVICE, "serve",
-        "--certificate", "/run/cam/service.pem", "--key", "/run/cam/service.key",
-        "--credentials", "/run/cam-account/credentials", "--controller", "dc1.corp.example",
-        "--default-unit", "Servers/Linux", stdin=subprocess.DEVNULL)
+        "--configuration", CONFIGURATION, stdin=subprocess.DEVNULL)
     until("the service listens", lambda: "serving corp.example" in dc1.read(log), 20)
     return process
 
@@ -100,7 +110,8 @@ def serve_as(dc2, name):
 
 def issue(dc1, host, *options, faketime=None):
     """A one-time code for the host."""
-    command = [SERVICE, "issue-code", "--host", host.name, *options]
+    command = [SERVICE, "issue-code", "--configuration", CONFIGURATION, "--host", host.name,
+               *options]
     if faketime:
         command = ["env", f"LD_PRELOAD={FAKETIME}", f"FAKETIME={faketime}", *command]
     code = dc1.ok(*command).out.strip()

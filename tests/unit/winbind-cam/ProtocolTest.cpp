@@ -31,43 +31,61 @@ Codes::Code AccountCode(std::string const& answer) {
     return CodeOf([&] { return ReadAccountAnswer(answer).controller; });
 }
 
-char const GoodDomain[] =
-    R"({"version": 1, "netbios": "CORP", "dns": "corp.example", "sid": "S-1-5-21-1-2-3"})"
-    "\n\n";
+char const GoodDomain[] = R"({"netbios": "CORP", "dns": "corp.example", "sid": "S-1-5-21-1-2-3"})";
 
-/// GoodDomain with another value for `key`.
-std::string DomainWith(char const* key, json const& value) {
-    json answer = json::parse(GoodDomain);
+char const GoodAccount[] =
+    R"({"controller": "dc1.corp.example", "blob": "Ab+/0=", "claim": "0a-1"})";
+
+/// `text` with another value for `key`.
+std::string With(char const* text, char const* key, json const& value) {
+    json answer = json::parse(text);
     answer[key] = value;
-    return answer.dump() + "\n\n";
+    return answer.dump();
 }
 
-TEST(ProtocolTest, ARequestIsOneLineOfJSON) {
-    EXPECT_EQ(json({{"version", 1}, {"request", "domain"}}), json::parse(DomainRequest()));
-    std::string const text = AccountRequest("host-01", "Servers/\"Linux\"\n");
-    EXPECT_EQ(text.size() - 1, text.find('\n'));
-    EXPECT_EQ(json({{"version", 1},
-                    {"request", "account"},
-                    {"account", "host-01"},
-                    {"unit", "Servers/\"Linux\"\n"}}),
-              json::parse(text));
+json Request(std::string const& host, char const* unit) {
+    return json::parse(View(AccountRequest(host, unit, "AB-12", "k3y")));
+}
+
+TEST(ProtocolTest, ARequestIsOneObjectOfJSON) {
+    EXPECT_EQ(json({{"host", "host-01"},
+                    {"unit", "Servers/\"Linux\"\n"},
+                    {"code", "AB-12"},
+                    {"host_key", "k3y"}}),
+              Request("host-01", "Servers/\"Linux\"\n"));
+    EXPECT_EQ(json({{"claim", "0a-1"}}), json::parse(View(ReceivedRequest("0a-1"))));
 }
 
 TEST(ProtocolTest, AHostThatLeavesTheUnitToTheServiceNamesNone) {
-    EXPECT_FALSE(json::parse(AccountRequest("host01", nullptr)).contains("unit"));
+    EXPECT_FALSE(Request("host01", nullptr).contains("unit"));
 }
 
 TEST(ProtocolTest, ANameThatNoHostHasIsNotAskedFor) {
+    auto const code = [](char const* name) {
+        return CodeOf([&] {
+            RequireHostName(name);
+            return 0;
+        });
+    };
     for (char const* name :
          {"", "a.b", "a b", "-a", "a-", "a\n", "host$", "h\xc3\xb6st", "a/b", "a234567890123456"}) {
-        EXPECT_EQ(Codes::InvalidComputerName, CodeOf([&] { return AccountRequest(name, nullptr); }))
-            << name;
+        EXPECT_EQ(Codes::InvalidComputerName, code(name)) << name;
     }
-    EXPECT_EQ(0U, CodeOf([] { return AccountRequest("a23456789012345", nullptr); }));
+    EXPECT_EQ(0U, code("a23456789012345"));
 }
 
 TEST(ProtocolTest, AUnitThatIsNoTextIsRefused) {
-    EXPECT_EQ(Codes::InvalidParameter, CodeOf([] { return AccountRequest("a", "\xff"); }));
+    EXPECT_EQ(Codes::InvalidParameter, CodeOf([] { return Request("a", "\xff"); }));
+}
+
+TEST(ProtocolTest, AHostsKeyIsItsOwnAndTheCodes) {
+    std::string const key = HostKey("machine", "CODE");
+    EXPECT_EQ(key, HostKey("machine", "CODE"));
+    EXPECT_NE(key, HostKey("machinE", "CODE"));
+    EXPECT_NE(key, HostKey("machine", "CODF"));
+    EXPECT_NE(key, HostKey("machineC", "ODE"));
+    EXPECT_EQ(64U, key.size());
+    EXPECT_EQ(std::string::npos, key.find_first_not_of("0123456789abcdef"));
 }
 
 TEST(ProtocolTest, ADomainsAnswerIsRead) {
@@ -79,41 +97,39 @@ TEST(ProtocolTest, ADomainsAnswerIsRead) {
 
 TEST(ProtocolTest, NonsenseIsNoAnswer) {
     for (char const* text :
-         {"", "\n\n", "x\n\n", "{}\n\n", "[]\n\n", "null\n\n", "{\"version\": 2}\n\n",
-          "{\"version\": \"1\"}\n\n", "{\"version\": 1.0}\n\n", "{\"version\": 1}\n\n",
-          "{\"version\": 1, \"netbios\": \"CORP\"", "[[[[[[[[\n\n", "\xff\xfe\n\n",
-          "{\"version\": 1, \"error\": 3}\n\n", "{\"version\": 1, \"error\": \"other\"}\n\n"}) {
+         {"", "\n", "x", "{}", "[]", "null", "{\"netbios\": \"CORP\"", "[[[[[[[[", "\xff\xfe",
+          "{\"error\": 3}", "{\"error\": \"other\"}", "{}{}", "<html></html>"}) {
         EXPECT_EQ(Codes::InvalidAnswer, DomainCode(text)) << text;
         EXPECT_EQ(Codes::InvalidAnswer, AccountCode(text)) << text;
-        EXPECT_FALSE(IsCodeSpent(text)) << text;
     }
 }
 
 TEST(ProtocolTest, ANameThatIsNoneIsNotHandedOn) {
-    EXPECT_EQ(0U, DomainCode(DomainWith("dns", "a-b.example")));
+    EXPECT_EQ(0U, DomainCode(With(GoodDomain, "dns", "a-b.example")));
     for (char const* key : {"netbios", "dns", "sid"}) {
         for (json const& value : {json(), json(1), json(""), json("a b"), json("a\nb"),
                                   json(std::string("a\0b", 3)), json(std::string(300, 'a'))}) {
-            EXPECT_EQ(Codes::InvalidAnswer, DomainCode(DomainWith(key, value)))
+            EXPECT_EQ(Codes::InvalidAnswer, DomainCode(With(GoodDomain, key, value)))
                 << key << " " << value;
         }
     }
-    EXPECT_EQ(Codes::InvalidAnswer, DomainCode(DomainWith("sid", "X-1-5")));
+    EXPECT_EQ(Codes::InvalidAnswer, DomainCode(With(GoodDomain, "sid", "X-1-5")));
 }
 
 TEST(ProtocolTest, AnAccountsAnswerIsRead) {
-    MachineAccount const account =
-        ReadAccountAnswer("{\"version\": 1, \"controller\": \"dc1.corp.example\"}\nAb+/0=\n");
+    MachineAccount const account = ReadAccountAnswer(GoodAccount);
     EXPECT_EQ("dc1.corp.example", account.controller);
     EXPECT_EQ("Ab+/0=", View(account.blob));
+    EXPECT_EQ("0a-1", account.claim);
 }
 
-TEST(ProtocolTest, AnAccountWithoutABlobIsNoAnswer) {
-    for (char const* blob : {"", "A b", "A\rb", "\"", "A\xff"}) {
-        EXPECT_EQ(
-            Codes::InvalidAnswer,
-            AccountCode(std::string("{\"version\": 1, \"controller\": \"dc1\"}\n") + blob + "\n"))
-            << blob;
+TEST(ProtocolTest, AnAccountThatLacksSomethingIsNoAnswer) {
+    for (json const& value : {json(), json(1), json(""), json("A b"), json("A\rb"), json("\""),
+                              json("A\n"), json(std::string(70000, '.'))}) {
+        for (char const* key : {"blob", "controller", "claim"}) {
+            EXPECT_EQ(Codes::InvalidAnswer, AccountCode(With(GoodAccount, key, value)))
+                << key << value;
+        }
     }
 }
 
@@ -124,30 +140,25 @@ TEST(ProtocolTest, EachRefusalHasItsCode) {
     } const refusals[] = {
         {"code-refused", 5},  {"too-many-attempts", 1909}, {"account-exists", 1316},
         {"no-such-unit", 87}, {"bad-request", 87},         {"failed", 1359},
+        {"busy", 1359},
     };
     for (auto const& refusal : refusals) {
-        std::string const answer =
-            json({{"version", 1}, {"error", refusal.error}, {"spent", false}}).dump() + "\n\n";
+        std::string const answer = json({{"error", refusal.error}}).dump();
         EXPECT_EQ(refusal.code, AccountCode(answer));
         EXPECT_EQ(refusal.code, DomainCode(answer));
     }
 }
 
-TEST(ProtocolTest, ACodeIsSpentWhereTheServiceSaysSo) {
-    EXPECT_TRUE(IsCodeSpent("{\"version\": 1, \"controller\": \"dc1\", \"spent\": true}\nAA\n"));
-    EXPECT_TRUE(IsCodeSpent("{\"version\": 1, \"error\": \"failed\", \"spent\": true}\n\n"));
-    EXPECT_FALSE(IsCodeSpent("{\"version\": 1, \"error\": \"failed\", \"spent\": false}\n\n"));
-    EXPECT_FALSE(IsCodeSpent("{\"version\": 1, \"error\": \"failed\", \"spent\": 1}\n\n"));
-    EXPECT_FALSE(IsCodeSpent("{\"version\": 1, \"error\": \"failed\"}\n\n"));
-}
-
 TEST(ProtocolTest, AFailureDoesNotTellTheBlob) {
-    try {
-        (void)ReadAccountAnswer("{\"version\": 1, \"controller\": \"a b\"}\nSECRET\n");
-        FAIL();
-    } catch (Failure const& failure) {
-        EXPECT_THAT(failure.what(), Not(HasSubstr("SECRET")));
-        EXPECT_THAT(failure.what(), HasSubstr("controller"));
+    for (char const* answer :
+         {R"({"controller": "a b", "blob": "SECRET", "claim": "1"})",
+          R"({"controller": "a", "blob": "SECRET!", "claim": "1"})", R"({"blob": "SECRET)"}) {
+        try {
+            (void)ReadAccountAnswer(answer);
+            ADD_FAILURE() << answer;
+        } catch (Failure const& failure) {
+            EXPECT_THAT(failure.what(), Not(HasSubstr("SECRET")));
+        }
     }
 }
 
