@@ -44,6 +44,9 @@ readonly service_packages=(
     python3-psycopg2 python3-sqlalchemy util-linux
 )
 
+# What several CAM services work with, and the browser that looks at their page.
+readonly fleet_packages=(chromium haproxy postgresql)
+
 # What the tests need beyond those.
 readonly test_packages=(
     googletest python3-jsonschema patch binutils "${service_packages[@]}"

@@ -65,7 +65,7 @@ class Hosts:
         self.is_ending = False
 
     def application(self):
-        application = web.Application(middlewares=[self._bounded, self._answered],
+        application = web.Application(middlewares=[self._answered, self._bounded],
                                       client_max_size=REQUEST_BYTES)
         application.router.add_get("/v1/domain", self.domain)
         application.router.add_post("/v1/accounts", self.account)

@@ -89,6 +89,8 @@ class Joining:
         unit = self._unit(seen.unit)
         exists = await self._domain.has_account(attempt.host, end)
         if exists and not seen.reuse and not seen.is_again:
+            # Another host with this code may have had it made since.
+            await self._in_thread(self._store.check, attempt, self._fits(attempt.unit))
             log(WARNING, f"{attempt.address}: the account of {attempt.host} exists already, and "
                          f"its code was issued without --reuse", **who)
             raise Answer("account-exists")

@@ -599,6 +599,18 @@ class Joining(Folder):
         self.assertEqual(BLOB, self.account(self.issue(reuse=True)))
         self.assertEqual([("host01", None, True)], self.domain.made)
 
+    def test_who_comes_behind_another_is_refused_and_not_told_of_its_account(self):
+        code = self.issue()
+        real = self.domain.has_account
+
+        async def meanwhile(host, end):
+            if not self.domain.made:
+                self.store.claim(self.attempt(code, key="another"), anything)
+                await self.domain.make_account(host, None, False, end)
+            return await real(host, end)
+        self.domain.has_account = meanwhile
+        self.assertEqual("code-refused", self.account(code))
+
     def test_whether_an_account_exists_is_not_told_to_a_stranger(self):
         self.domain.accounts = ["host01"]
         self.issue()
