@@ -1,13 +1,14 @@
 # SPDX-License-Identifier: Apache-2.0
 """The command line."""
 import argparse
+import json
 import os
 import pwd
 import re
 import sys
 import syslog
 
-from . import codes, configuration, units
+from . import codes, configuration, orders, units
 from .configuration import Wrong
 from .domain import NetError
 from .store import BrokenState, NoStore, Store
@@ -65,6 +66,17 @@ def arguments(line):
                        help="after which the code is refused (%(default)s)")
     issue.add_argument("--reuse", action="store_true",
                        help="take over an account of that name, which makes its secret invalid")
+    bulk = verb("issue-codes", "Issue the codes of a list of hosts: all of them or none")
+    bulk.add_argument("--input", metavar="FILE", required=True,
+                      help="CSV whose first line names its columns (host, unit, networks, minutes, "
+                           "reuse), or a list of such objects in JSON")
+    bulk.add_argument("--output", metavar="FILE", required=True,
+                      help="gets the hosts and codes in the same form; it must not exist")
+    bulk.add_argument("--recipient", metavar="CERTIFICATE",
+                      help="encrypt the output to the certificate's owner (openssl cms)")
+    export = verb("export-audit", "Print what was done, an object of JSON a line")
+    export.add_argument("--after", type=int, default=0, metavar="NUMBER",
+                        help="what comes behind the entry of that number")
     verb("list-codes", "List the hosts that have an unused code")
     revoke = verb("revoke-code", "Make a host's code worthless")
     revoke.add_argument("--host", type=host_name, required=True)
@@ -127,20 +139,72 @@ def list_codes(store, _, __):
               *([row["networks"]] if row["networks"] else []), sep="\t")
 
 
+def form_of(file):
+    return "json" if file.endswith(".json") else "csv"
+
+
+class Lists:
+    """The operator's own files, which the service's user need not reach; nothing is issued where
+    one of them is not as it should be."""
+
+    def __init__(self, options):
+        self._form = form_of(options.input)
+        with open(options.input, encoding="utf-8") as file:
+            self.wanted = orders.parsed(file.read(), self._form)
+        self._recipient = None
+        if options.recipient:
+            with open(options.recipient, encoding="utf-8") as file:
+                self._recipient = file.read()
+            orders.encrypted("", self._recipient)
+        self._output = open(options.output, "x", encoding="utf-8")  # mode 0600, by the mask
+
+    def write(self, issued):
+        text = orders.printed(self.wanted, issued, self._form)
+        with self._output as file:
+            file.write(orders.encrypted(text, self._recipient) if self._recipient else text)
+            file.flush()
+            os.fsync(file.fileno())
+
+    def withdraw(self, path):
+        self._output.close()
+        os.unlink(path)
+
+
+def issue_codes(store, options, who):
+    try:
+        issued = store.issue_all(options.lists.wanted, who)
+    except BaseException:
+        options.lists.withdraw(options.output)
+        raise
+    options.lists.write(issued)
+    syslog.syslog(syslog.LOG_NOTICE, f"{len(issued)} codes were issued by {who}")
+
+
+def export_audit(store, options, _):
+    after = options.after
+    while rows := store.audit(after):
+        for row in rows:
+            print(json.dumps(row))
+        after = rows[-1]["id"]
+
+
 def revoke_code(store, options, who):
     if not store.revoke(options.host, who):
         raise Wrong(f"{options.host} has no code")
 
 
-ON_THE_STORE = {"issue-code": issue_code, "list-codes": list_codes, "revoke-code": revoke_code}
+ON_THE_STORE = {"issue-code": issue_code, "issue-codes": issue_codes, "list-codes": list_codes,
+                "revoke-code": revoke_code, "export-audit": export_audit}
 
 
 def run(options):
     serves = options.verb in ("serve", "check")
     configured = configuration.read(options.configuration, serves)
     who = operator()
-    become(prepare(configured.state))
     os.umask(0o077)
+    if options.verb == "issue-codes":
+        options.lists = Lists(options)
+    become(prepare(configured.state))
     if options.verb == "serve":
         from .server import serve  # what it takes, the other verbs need not wait for
         serve(configured)

@@ -3,6 +3,7 @@
 import asyncio
 import concurrent.futures
 import contextlib
+import os
 import signal
 import socket
 import ssl
@@ -13,12 +14,14 @@ from aiohttp import web
 from . import log as logs
 from .configuration import require_protected
 from .domain import Domain
-from .doors import Doors
+from .doors import REQUEST_SECONDS, Doors
 from .hosts import Hosts
 from .joining import Joining
 from .limits import Refusals
 from .log import ERROR, NOTICE, log
 from .metrics import Metrics
+from .operators import Operators, certificate_name, user_of
+from .operators import certificate_context as operator_context
 from .store import BrokenState, NoStore, Store
 
 # What an answer may take when the service is told to end; a host gives up after 30 s.
@@ -70,6 +73,7 @@ class Server:
             self._doors = self._hosts.doors = Doors(handler, context, limits, server["proxies"])
             self._metrics.watch(self._doors)
             await self._listen_for_metrics(stack)
+            await self._listen_for_operators(stack)
             loop = asyncio.get_running_loop()
             listener = await loop.create_server(
                 self._doors, server["address"], server["port"], backlog=BACKLOG,
@@ -105,6 +109,29 @@ class Server:
         listener = await asyncio.get_running_loop().create_server(
             handler, where["address"], where["port"])
         stack.callback(listener.close)
+
+    async def _listen_for_operators(self, stack):
+        operators = self._configuration["operators"]
+        loop = asyncio.get_running_loop()
+
+        def application(roles, identify):
+            return Operators(self._store, self._metrics, roles, identify,
+                             lambda *call: loop.run_in_executor(self._threads, *call)).application()
+        if operators["socket"] is not None:
+            handler = await self._handler(stack, application(operators["users"], user_of))
+            with contextlib.suppress(FileNotFoundError):
+                os.unlink(operators["socket"])  # of a service that was killed
+            listener = await loop.create_unix_server(handler, operators["socket"])
+            os.chmod(operators["socket"], 0o666)  # the roles decide
+            stack.callback(listener.close)
+        if operators["port"] is not None:
+            handler = await self._handler(
+                stack, application(operators["certificates"], certificate_name))
+            listener = await loop.create_server(
+                handler, operators["address"], operators["port"],
+                ssl=operator_context(self._configuration["server"], operators),
+                ssl_handshake_timeout=REQUEST_SECONDS)
+            stack.callback(listener.close)
 
     async def metrics(self, request):
         try:

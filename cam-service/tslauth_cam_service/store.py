@@ -222,6 +222,15 @@ class Store:
                 sa.select(schema.AUDIT).where(schema.AUDIT.c.id > after)
                 .order_by(schema.AUDIT.c.id).limit(limit)).mappings()]
 
+    def refusals(self, limit):
+        """Who was refused last, the newest first."""
+        with self._transaction() as connection:
+            rows = connection.execute(
+                sa.select(schema.AUDIT).where(schema.AUDIT.c.action == "refused")
+                .order_by(schema.AUDIT.c.id.desc()).limit(limit)).mappings()
+            return [{**row, "when": time.strftime("%F %T", time.gmtime(row["at"]))}
+                    for row in rows]
+
     def counts(self):
         """How many codes are in each state."""
         with self._transaction() as connection:

@@ -175,6 +175,12 @@ class TrafficTest(unittest.TestCase):
                 if silent.recv(1) == b"":
                     raise ConnectionResetError
 
+    def test_the_unit_leaves_the_service_little(self):
+        judged = subprocess.run(
+            ["systemd-analyze", "security", "--offline=true", "--no-pager", "--threshold=15",
+             TREE / "cam-service/tslauth-cam-service.service"], capture_output=True, text=True)
+        self.assertEqual(0, judged.returncode, judged.stdout[-300:] + judged.stderr)
+
     def test_a_new_certificate_is_taken_without_a_restart(self):
         own = pathlib.Path("/etc/tessel/cam")
         process = self.fleet.processes[0]

@@ -27,7 +27,7 @@ import alembic.migration
 import sqlalchemy as sa
 
 from tslauth_cam_service import (codes, commands, configuration, domain, doors, joining, limits,
-                                 log, schema, store, units)
+                                 log, orders, schema, store, units)
 
 DNS = "corp.example"
 BLOB = "QkxPQg=="
@@ -718,6 +718,67 @@ class Configurations(unittest.TestCase):
                 (self.LEAST + "[operators]\nport = 1", "authorities")):
             with self.assertRaisesRegex(configuration.Wrong, named, msg=text):
                 configuration.parsed(text)
+
+
+class Lists(unittest.TestCase):
+    """Of hosts, and of their codes."""
+
+    def test_csv_and_json_say_the_same(self):
+        wanted = [codes.Order("h1", "A/B", "192.0.2.0/24", 30, True), codes.Order("h2")]
+        self.assertEqual(wanted, orders.parsed(
+            'host,unit,networks,minutes,reuse\nh1,A/B,192.0.2.0/24,30,yes\nh2,,,,\n', "csv"))
+        self.assertEqual(wanted, orders.parsed(json.dumps([
+            {"host": "h1", "unit": "A/B", "networks": "192.0.2.0/24", "minutes": 30,
+             "reuse": True}, {"host": "h2"}]), "json"))
+        self.assertEqual("host,code\nh1,X\nh2,Y\n", orders.printed(wanted, "XY", "csv"))
+        self.assertEqual([{"host": "h1", "code": "X"}, {"host": "h2", "code": "Y"}],
+                         json.loads(orders.printed(wanted, "XY", "json")))
+
+    def test_a_wrong_entry_is_named_and_nothing_is_taken(self):
+        for text, form, named in (
+                ("[", "json", "no JSON"), ("{}", "json", "a list"), ("[" * 9999, "json", "no JSON"),
+                ('[{"host": "a"}, {"host": "A"}]', "json", "entry 2: A is named twice"),
+                ('[{"host": "a", "colour": 1}]', "json", "entry 1: an entry has no other"),
+                ('[{"host": 3}]', "json", "'host' is a text"), ("[3]", "json", "entry 1"),
+                ('[{"host": "a", "minutes": true}]', "json", "minutes"),
+                ('[{"host": "a", "reuse": "yes"}]', "json", "'reuse' is true or false"),
+                ("host\na b\n", "csv", "entry 1: a host has"), ("name\na\n", "csv", "entry 1"),
+                ("host,reuse\na,true\n", "csv", "'reuse' is yes or no"),
+                ("host\na,b\n", "csv", "more or fewer"), ("host,unit\na\n", "csv", "more or"),
+                ("host,minutes\na,1x\n", "csv", "'minutes' is a number")):
+            with self.assertRaisesRegex(orders.Wrong, named, msg=text):
+                orders.parsed(text, form)
+
+    def test_the_owner_of_the_certificate_reads_the_codes(self):
+        with tempfile.TemporaryDirectory() as folder:
+            def run(*command, **more):
+                return subprocess.run(command, check=True, capture_output=True, cwd=folder, **more)
+            run("openssl", "req", "-x509", "-newkey", "rsa:2048", "-nodes", "-subj", "/CN=x",
+                "-keyout", "key.pem", "-out", "cert.pem")
+            file = pathlib.Path(folder, "service.toml")
+            file.write_text(f'state = "{folder}/state"\n')
+            pathlib.Path(folder, "hosts.csv").write_text("host\nh1\nh2\n")
+            command = [sys.executable, "-B", PROGRAM, "issue-codes", "--configuration", file,
+                       "--input", "hosts.csv", "--recipient", "cert.pem", "--output", "codes.cms"]
+            run(*command)
+            output = pathlib.Path(folder, "codes.cms")
+            self.assertEqual(0o600, output.stat().st_mode & 0o7777)
+            self.assertIn("-----BEGIN CMS-----", output.read_text())
+            plain = run("openssl", "cms", "-decrypt", "-inform", "PEM", "-in", "codes.cms",
+                        "-inkey", "key.pem", "-recip", "cert.pem").stdout.decode()
+            self.assertRegex(plain, r"^host,code\r?\nh1,([A-Z2-9]{4}-?){8}\r?\nh2,")
+            kept = store.Store(f"sqlite:///{folder}/state/codes.db", folder)
+            self.addCleanup(kept.close)
+            code = re.search("h1,(.*)", plain)[1].strip()
+            kept.check(store.Attempt("h1", code, "key", "192.0.2.1"), anything)
+            # What is there is not written over, and what cannot be encrypted is not issued.
+            for wrong in ([], ["--output", "other", "--recipient", "hosts.csv"]):
+                with self.assertRaises(subprocess.CalledProcessError):
+                    run(*command, *wrong)
+            self.assertEqual(2, len(kept.page()))
+            exported = run(sys.executable, "-B", PROGRAM, "export-audit", "--configuration",
+                           file).stdout.decode().splitlines()
+            self.assertEqual(["H1", "H2"], [json.loads(line)["host"] for line in exported])
 
 
 class Commands(unittest.TestCase):
