@@ -35,7 +35,8 @@ class Joining:
         self._refusals = refusals
         self._places = asyncio.Semaphore(places)
         self._threads = threads
-        self.seconds_in_net = 0.0
+        self._unnoted = []
+        self._noting = asyncio.Lock()
 
     @property
     def domain(self):
@@ -53,9 +54,9 @@ class Joining:
         try:
             # All that can be known before is asked before the code is claimed, and before the
             # host takes a place: who has no code waits for nobody.
-            await self._in_thread(self._store.check, attempt, self._fits(attempt.unit))
+            seen = await self._in_thread(self._store.check, attempt, self._fits(attempt.unit))
             async with _place(self._places):
-                return await self._make(attempt, who)
+                return await self._make(attempt, seen, who)
         except codes.Refused as reason:
             self._refusals.add(attempt.address)
             log(WARNING, f"{wants}: refused, {reason}", **who)
@@ -82,10 +83,9 @@ class Joining:
             log(ERROR, f"{address}: a receipt cannot be kept: {error}", address=address)
             raise Answer("failed") from None
 
-    async def _make(self, attempt, who):
+    async def _make(self, attempt, seen, who):
         begin = time.monotonic()
         end = begin + NET_SECONDS
-        seen = await self._in_thread(self._store.check, attempt, self._fits(attempt.unit))
         unit = self._unit(seen.unit)
         exists = await self._domain.has_account(attempt.host, end)
         if exists and not seen.reuse and not seen.is_again:
@@ -96,7 +96,6 @@ class Joining:
             raise Answer("account-exists")
         claim = await self._in_thread(self._store.claim, attempt, self._fits(attempt.unit))
         blob = await self._claimed(claim, unit, exists or claim.is_again, end)
-        self.seconds_in_net += time.monotonic() - begin
         log(NOTICE, f"{attempt.address}: made the account of {attempt.host}"
                     f"{' (taken over)' if exists else ''} in {unit or 'the default container'}, "
                     f"{time.monotonic() - begin:.1f} s", **who)
@@ -118,11 +117,17 @@ class Joining:
         return blob
 
     async def _note_refusal(self, attempt, reason):
-        """The audit's entry; the answer is the same without."""
-        try:
-            await self._in_thread(self._store.refused, attempt.host, attempt.address, reason)
-        except (store.BrokenState, store.NoStore) as error:
-            log(ERROR, f"a refusal cannot be noted: {error}")
+        """The audit's entry; the answer is the same without. Those that come while one batch is
+        written go into the next, so that a flood of them is no flood of transactions."""
+        self._unnoted.append((attempt.host, attempt.address, reason))
+        async with self._noting:
+            batch, self._unnoted = self._unnoted, []
+            if not batch:
+                return  # another one's batch had it
+            try:
+                await self._in_thread(self._store.refused, batch)
+            except (store.BrokenState, store.NoStore) as error:
+                log(ERROR, f"{len(batch)} refusals cannot be noted: {error}")
 
     def _unit(self, text):
         text = text or self._default_unit

@@ -7,6 +7,7 @@ import os
 import signal
 import socket
 import ssl
+import sys
 import time
 
 from aiohttp import web
@@ -176,6 +177,8 @@ class Server:
 
 def serve(configuration):
     logs.form = configuration[""]["log"]
+    if sys.version_info < (3, 12):  # from then on it is what asyncio does by itself
+        asyncio.set_child_watcher(asyncio.PidfdChildWatcher())  # and no thread for each child
     asyncio.run(_served(configuration))
 
 

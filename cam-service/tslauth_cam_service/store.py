@@ -26,6 +26,8 @@ REVISION = "0001"
 LEASE_SECONDS = 30
 # For which a host may come back for an account that was made and did not reach it.
 FOUND_SECONDS = 900
+# So many hosts in one statement.
+PART = 500
 # Further steps of the same claim are tried again for so long where the database is away.
 PATIENCE_SECONDS = 8
 
@@ -70,9 +72,11 @@ def key_digest(attempt):
 
 
 def engine_of(url):
-    engine = sa.create_engine(url, future=True, pool_pre_ping=True,
-                              **({} if url.startswith("sqlite") else
-                                 {"pool_size": 8, "connect_args": {"connect_timeout": 3}}))
+    is_file = url.startswith("sqlite")
+    # One connection a thread at the most; each is one thread's at a time.
+    engine = sa.create_engine(
+        url, future=True, pool_pre_ping=not is_file, poolclass=sa.pool.QueuePool, pool_size=8,
+        connect_args={"check_same_thread": False} if is_file else {"connect_timeout": 3})
     if engine.dialect.name == "sqlite":
         @sa.event.listens_for(engine, "connect")
         def connected(connection, _):
@@ -83,7 +87,9 @@ def engine_of(url):
 
         @sa.event.listens_for(engine, "begin")
         def begun(connection):
-            connection.exec_driver_sql("BEGIN IMMEDIATE")
+            # Who only looks waits for nobody who writes.
+            looks = connection.get_execution_options().get("looks", False)
+            connection.exec_driver_sql("BEGIN" if looks else "BEGIN IMMEDIATE")
     return engine
 
 
@@ -95,6 +101,7 @@ class Store:
 
     def __init__(self, url, folder, clock=None):
         self._engine = engine_of(url)
+        self._looking = self._engine.execution_options(looks=True)
         self._file = pathlib.Path(folder) / "codes.json"
         self._clock = clock
 
@@ -112,7 +119,7 @@ class Store:
     def is_ready(self):
         """Whether the database answers and its tables are of this version."""
         try:
-            with self._transaction() as connection:
+            with self._look() as connection:
                 return self._revision(connection) == REVISION
         except (NoStore, sa.exc.SQLAlchemyError):
             return False
@@ -159,7 +166,7 @@ class Store:
             for host, issued in former.items():
                 if connection.execute(sa.select(schema.CODES.c.id).where(
                         schema.CODES.c.digest == issued["digest"])).first() is None:
-                    self._replace(connection, host.upper(), now)
+                    self._replace(connection, [host.upper()], now)
                     connection.execute(schema.CODES.insert().values(
                         host=host.upper(), salt=issued["salt"], digest=issued["digest"],
                         unit=issued["unit"], reuse=issued["reuse"], issued_at=now,
@@ -179,17 +186,25 @@ class Store:
         issued = [codes.new_code() for _ in orders]
         with self._transaction() as connection:
             now = self._now(connection)
-            for order, code in zip(orders, issued):
-                host = order.host.upper()
-                salt = secrets.token_bytes(16)
-                self._replace(connection, host, now)
-                connection.execute(schema.CODES.insert().values(
-                    host=host, salt=salt.hex(), digest=codes.digest(salt, host, code),
-                    unit=order.unit, networks=order.networks, reuse=order.reuse, issued_at=now,
-                    expires_at=now + order.minutes * 60, issuer=issuer, state=schema.ISSUED,
-                    changed_at=now))
-                self._note(connection, now, issuer, "issued", host, None, "done")
+            for first in range(0, len(orders), PART):
+                part = slice(first, first + PART)
+                self._issue(connection, now, orders[part], issued[part], issuer)
         return issued
+
+    def _issue(self, connection, now, orders, issued, issuer):
+        rows = []
+        for order, code in zip(orders, issued):
+            host, salt = order.host.upper(), secrets.token_bytes(16)
+            rows.append({
+                "host": host, "salt": salt.hex(), "digest": codes.digest(salt, host, code),
+                "unit": order.unit, "networks": order.networks, "reuse": order.reuse,
+                "issued_at": now, "expires_at": now + order.minutes * 60, "issuer": issuer,
+                "state": schema.ISSUED, "changed_at": now})
+        self._replace(connection, [row["host"] for row in rows], now)
+        connection.execute(schema.CODES.insert(), rows)
+        connection.execute(schema.AUDIT.insert(), [
+            {"at": now, "actor": issuer, "action": "issued", "host": row["host"], "address": None,
+             "outcome": "done"} for row in rows])
 
     def revoke(self, host, actor):
         """Whether the host had a code."""
@@ -208,7 +223,7 @@ class Store:
         columns = [table.c.id, table.c.host, table.c.unit, table.c.networks, table.c.reuse,
                    table.c.issued_at, table.c.expires_at, table.c.issuer, table.c.state,
                    table.c.changed_at, table.c.address]
-        with self._transaction() as connection:
+        with self._look() as connection:
             now = self._now(connection)
             rows = connection.execute(sa.select(*columns).where(
                 table.c.id > after, table.c.state.in_(states)
@@ -217,14 +232,14 @@ class Store:
 
     def audit(self, after=0, limit=1000):
         """What was done, the oldest first, from the entry behind the number `after`."""
-        with self._transaction() as connection:
+        with self._look() as connection:
             return [dict(row) for row in connection.execute(
                 sa.select(schema.AUDIT).where(schema.AUDIT.c.id > after)
                 .order_by(schema.AUDIT.c.id).limit(limit)).mappings()]
 
     def refusals(self, limit):
         """Who was refused last, the newest first."""
-        with self._transaction() as connection:
+        with self._look() as connection:
             rows = connection.execute(
                 sa.select(schema.AUDIT).where(schema.AUDIT.c.action == "refused")
                 .order_by(schema.AUDIT.c.id.desc()).limit(limit)).mappings()
@@ -233,7 +248,7 @@ class Store:
 
     def counts(self):
         """How many codes are in each state."""
-        with self._transaction() as connection:
+        with self._look() as connection:
             return {state: number for state, number in connection.execute(
                 sa.select(schema.CODES.c.state, sa.func.count()).group_by(schema.CODES.c.state))}
 
@@ -259,8 +274,8 @@ class Store:
 
         Refused where it would get none, or where fits(unit) raises it; InUse.
         """
-        with self._transaction() as connection:
-            row, now = self._open_code(connection, attempt)
+        with self._look() as connection:
+            row, now = self._open_code(connection, attempt, False)
             return self._claim(row, attempt, now, fits)
 
     def claim(self, attempt, fits):
@@ -268,7 +283,7 @@ class Store:
         what an attempt has claimed already is its own."""
         def step():
             with self._transaction() as connection:
-                row, now = self._open_code(connection, attempt)
+                row, now = self._open_code(connection, attempt, True)
                 claim = self._claim(row, attempt, now, fits)
                 found_until = row.found_until if row.found_until else now + FOUND_SECONDS
                 connection.execute(schema.CODES.update().where(schema.CODES.c.id == row.id).values(
@@ -320,17 +335,21 @@ class Store:
             self._note(connection, now, "host", "received", row.host, address, "done")
             return True
 
-    def refused(self, host, address, reason):
+    def refused(self, refusals):
+        """Notes refusals, each a host, an address and a reason, in one transaction."""
         with self._transaction() as connection:
-            self._note(connection, self._now(connection), "host", "refused", host, address, reason)
+            now = self._now(connection)
+            connection.execute(schema.AUDIT.insert(), [
+                {"at": now, "actor": "host", "action": "refused", "host": host.upper(),
+                 "address": address, "outcome": reason} for host, address, reason in refusals])
 
     # --- steps of the above ---
 
-    def _open_code(self, connection, attempt):
-        """The host's code, locked, and the database's time."""
-        row = connection.execute(sa.select(schema.CODES).where(
-            schema.CODES.c.host == attempt.host.upper(), schema.CODES.c.state.in_(schema.OPEN)
-        ).with_for_update()).first()
+    def _open_code(self, connection, attempt, is_locked):
+        """The host's code, and the database's time."""
+        code = sa.select(schema.CODES).where(
+            schema.CODES.c.host == attempt.host.upper(), schema.CODES.c.state.in_(schema.OPEN))
+        row = connection.execute(code.with_for_update() if is_locked else code).first()
         return row, self._now(connection)
 
     @staticmethod
@@ -358,9 +377,9 @@ class Store:
                      row.state != schema.ISSUED and not is_mine)
 
     @staticmethod
-    def _replace(connection, host, now):
+    def _replace(connection, hosts, now):
         connection.execute(schema.CODES.update().where(
-            schema.CODES.c.host == host, schema.CODES.c.state.in_(schema.OPEN)
+            schema.CODES.c.host.in_(hosts), schema.CODES.c.state.in_(schema.OPEN)
         ).values(state=schema.REPLACED, changed_at=now))
 
     @staticmethod
@@ -378,10 +397,13 @@ class Store:
                 sa.text("SELECT extract(epoch FROM clock_timestamp())")).scalar())
         return time.time()
 
+    def _look(self):
+        return self._transaction(self._looking)
+
     @contextlib.contextmanager
-    def _transaction(self):
+    def _transaction(self, engine=None):
         try:
-            with self._engine.begin() as connection:
+            with (engine or self._engine).begin() as connection:
                 yield connection
         except (sa.exc.OperationalError, sa.exc.InterfaceError, sa.exc.TimeoutError) as error:
             raise NoStore(str(getattr(error, "orig", None) or error).strip()) from None

@@ -336,7 +336,7 @@ class Tables(Folder):
 
     def test_every_step_is_in_the_audit(self):
         code = self.issue()
-        self.store.refused("host01", "192.0.2.9", "the code is wrong")
+        self.store.refused([("host01", "192.0.2.9", "the code is wrong")])
         self.take(code)
         self.store.revoke("host01", "alice")
         self.assertEqual(
@@ -610,6 +610,12 @@ class Joining(Folder):
             return await real(host, end)
         self.domain.has_account = meanwhile
         self.assertEqual("code-refused", self.account(code))
+
+    def test_every_one_of_many_refusals_is_noted(self):
+        self.ask(*(self.attempt("WRONG", host=f"host{i}") for i in range(40)))
+        noted = [row["host"] for row in self.store.audit() if row["action"] == "refused"]
+        self.assertEqual({f"HOST{i}" for i in range(40)}, set(noted))
+        self.assertEqual(40, len(noted))
 
     def test_whether_an_account_exists_is_not_told_to_a_stranger(self):
         self.domain.accounts = ["host01"]
