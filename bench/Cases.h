@@ -21,6 +21,7 @@ void AddActiveDirectoryProviderCases(Table& table);
 void AddActiveDirectoryStoreCases(Table& table, Places const& places);
 void AddActiveDirectoryStoreQuestionsCases(Table& table);
 void AddCertificateThumbprintCases(Table& table);
+void AddHistoryCases(Table& table);
 void AddTslauthctlCases(Table& table);
 
 } // namespace bench

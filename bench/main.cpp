@@ -36,6 +36,7 @@ int main(int count, char** values) {
     AddActiveDirectoryStoreCases(table, places);
     AddActiveDirectoryStoreQuestionsCases(table);
     AddCertificateThumbprintCases(table);
+    AddHistoryCases(table);
     AddTslauthctlCases(table);
     if (observe) {
         table.Observe();

@@ -2,6 +2,7 @@
 #include "analysis/ChangeLog.h"
 #include "analysis/Failures.h"
 #include "analysis/NearestName.h"
+#include "terminal/HeldSignals.h"
 #include "terminal/StandardDescriptors.h"
 #include "verbs/Verbs.h"
 
@@ -54,6 +55,7 @@ struct Arguments {
     bool deep = false;
     std::string provider;
     AccessArguments access;
+    UndoArguments undo;
     bool list = false;
     JoinArguments join;
     /// Of a domain or of a user.
@@ -113,6 +115,7 @@ public:
 
         AddSetup(*plan, arguments);
         AddAccess(*plan, arguments);
+        AddHistory(arguments);
         AddMembership(arguments);
         AddQuestions(arguments);
         AddCAM(arguments);
@@ -258,6 +261,30 @@ private:
                 permit->add_flag("--list", arguments.list, "List who may log in");
             }
         }
+    }
+
+    void AddHistory(Arguments& arguments) {
+        auto const addNumber = [&](CLI::App& command) {
+            return command.add_option("number", arguments.undo.number, "The change's number")
+                ->check(CLI::Range(1U, std::numeric_limits<unsigned>::max()).description(""))
+                ->type_name("N");
+        };
+        auto* history = Add("history", "List the changes of the host that can be undone", arguments,
+                            [](Console& console) { return RunHistory(console); });
+        history->require_subcommand(0, 1);
+        auto* show =
+            Add(*history, "show", "Show what a change has written", arguments,
+                [&](Console& console) { return RunShowHistory(arguments.undo.number, console); });
+        addNumber(*show)->required();
+        auto* undo =
+            Add("undo",
+                "Make the host what it was before a change; the newest if none is "
+                "named",
+                arguments, [&](Console& console) { return RunUndo(arguments.undo, console); });
+        addNumber(*undo);
+        undo->add_flag("--dry-run", arguments.undo.dryRun, "Show it, and change nothing");
+        undo->add_flag("--force", arguments.undo.force,
+                       "Also where others have edited the files since");
     }
 
     void AddMembership(Arguments& arguments) {
@@ -499,6 +526,7 @@ int main(int argc, char** argv) {
     OpenClosedStandardDescriptors();
     try {
         int const exitCode = Run(WithHelpAsOption(argc, argv));
+        LetSignalsThrough(); // what was to be said has been said
         if (HasAbandonedCalls()) {
             _exit(exitCode); // everything has been written
         }

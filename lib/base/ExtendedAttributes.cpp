@@ -1,13 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "ExtendedAttributes.h"
 
-#include <algorithm>
 #include <cerrno>
-#include <optional>
-#include <string>
 #include <string_view>
 #include <sys/types.h>
 #include <sys/xattr.h>
+#include <utility>
 #include <vector>
 
 namespace tessel::base {
@@ -61,24 +59,38 @@ std::optional<std::vector<std::string>> Names(int file) {
 
 } // namespace
 
-bool CopyExtendedAttributes(int from, int to) {
-    auto const wanted = Names(from);
-    auto const present = Names(to);
-    if (!wanted || !present) {
+std::optional<ExtendedAttributes> ReadExtendedAttributes(int file) {
+    auto const names = Names(file);
+    if (!names) {
+        return std::nullopt;
+    }
+    ExtendedAttributes attributes;
+    for (std::string const& name : *names) {
+        auto value = Whole([file, &name](char* buffer, std::size_t size) {
+            return ::fgetxattr(file, name.c_str(), buffer, size);
+        });
+        if (!value) {
+            return std::nullopt;
+        }
+        attributes.emplace(name, std::move(*value));
+    }
+    return attributes;
+}
+
+bool SetExtendedAttributes(int file, ExtendedAttributes const& wanted) {
+    auto const present = Names(file);
+    if (!present) {
         return false;
     }
     // What the folder gave to the new file, a default access control list for one.
     for (std::string const& name : *present) {
-        if (std::find(wanted->begin(), wanted->end(), name) == wanted->end() &&
-            ::fremovexattr(to, name.c_str()) != 0 && errno != ENODATA) {
+        if (wanted.count(name) == 0 && ::fremovexattr(file, name.c_str()) != 0 &&
+            errno != ENODATA) {
             return false;
         }
     }
-    for (std::string const& name : *wanted) {
-        auto const value = Whole([from, &name](char* buffer, std::size_t size) {
-            return ::fgetxattr(from, name.c_str(), buffer, size);
-        });
-        if (!value || ::fsetxattr(to, name.c_str(), value->data(), value->size(), 0) != 0) {
+    for (auto const& [name, value] : wanted) {
+        if (::fsetxattr(file, name.c_str(), value.data(), value.size(), 0) != 0) {
             return false;
         }
     }

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "WholeFile.h"
 
-#include "ExtendedAttributes.h"
 #include "FileError.h"
 
 #include <algorithm>
@@ -73,8 +72,15 @@ std::size_t StartOfName(std::string const& path) {
 }
 
 /// An ordinary user may not give files away, and keeps what the system gave.
-bool GiveOwner(int descriptor, struct stat const& like) {
-    return ::fchown(descriptor, like.st_uid, like.st_gid) == 0 || ::geteuid() != 0;
+bool GiveOwner(int descriptor, FileAttributes const& wanted) {
+    return ::fchown(descriptor, wanted.owner, wanted.group) == 0 || ::geteuid() != 0;
+}
+
+/// In this order: a change of the owner clears bits of the mode, and an access control list brings
+/// some.
+bool GiveAttributes(int descriptor, FileAttributes const& wanted) {
+    return GiveOwner(descriptor, wanted) && SetExtendedAttributes(descriptor, wanted.extended) &&
+           ::fchmod(descriptor, wanted.mode) == 0;
 }
 
 } // namespace
@@ -167,6 +173,19 @@ void SyncFolderOf(std::string const& path) noexcept {
     }
 }
 
+std::optional<FileAttributes> ReadAttributes(int file) {
+    struct stat status = {};
+    if (::fstat(file, &status) != 0) {
+        return std::nullopt;
+    }
+    auto extended = ReadExtendedAttributes(file);
+    if (!extended) {
+        return std::nullopt;
+    }
+    return FileAttributes{status.st_mode & 07777, status.st_uid, status.st_gid,
+                          std::move(*extended)};
+}
+
 FileReplacement::FileReplacement(std::string const& path, std::string_view text, Replacing how)
     : _path(path), _target(how.links == Links::Follow ? Destination(path) : path) {
     std::size_t const name = StartOfName(_target);
@@ -176,14 +195,14 @@ FileReplacement::FileReplacement(std::string const& path, std::string_view text,
         throw FileError("replace", _path, errno);
     }
     try {
-        Fill(text, how.newMode);
+        Fill(text, how);
     } catch (...) {
         (void)::unlink(_temporary.c_str()); // there is a failure on its way that matters more
         throw;
     }
 }
 
-void FileReplacement::Fill(std::string_view text, mode_t newMode) {
+void FileReplacement::Fill(std::string_view text, Replacing const& how) {
     Descriptor const old(
         ::open(_target.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY | O_NOFOLLOW));
     // A link that is replaced by a file has nothing to keep.
@@ -191,20 +210,22 @@ void FileReplacement::Fill(std::string_view text, mode_t newMode) {
     if (!_existed && errno != ENOENT && errno != ELOOP) {
         throw FileError("replace", _path, errno);
     }
-    struct stat like = {};
-    if (_existed && ::fstat(old.Get(), &like) != 0) {
+    struct stat status = {};
+    if (_existed && ::fstat(old.Get(), &status) != 0) {
         throw FileError("replace", _path, errno);
     }
-    if (_existed && !S_ISREG(like.st_mode)) {
+    if (_existed && !S_ISREG(status.st_mode)) {
         throw FileError("replace", _path, NotRegular);
     }
-    mode_t const mode = _existed ? like.st_mode & 07777 : newMode;
-    // In this order: a change of the owner clears bits of the mode, and an access control list
-    // brings some; all of it before the sync, so that nothing is durable without the rest.
-    bool const filled = WriteAll(_file.Get(), text) &&
-                        (!_existed || (GiveOwner(_file.Get(), like) &&
-                                       CopyExtendedAttributes(old.Get(), _file.Get()))) &&
-                        ::fchmod(_file.Get(), mode) == 0 && ::fsync(_file.Get()) == 0;
+    auto wanted = how.attributes;
+    if (!wanted && _existed && !(wanted = ReadAttributes(old.Get()))) {
+        throw FileError("replace", _path, errno);
+    }
+    // All of it before the sync, so that nothing is durable without the rest.
+    bool const filled =
+        WriteAll(_file.Get(), text) &&
+        (wanted ? GiveAttributes(_file.Get(), *wanted) : ::fchmod(_file.Get(), how.newMode) == 0) &&
+        ::fsync(_file.Get()) == 0;
     if (!filled) {
         throw FileError("replace", _path, errno);
     }

@@ -2,6 +2,7 @@
 #pragma once
 
 #include "Descriptor.h"
+#include "ExtendedAttributes.h"
 
 #include <optional>
 #include <string>
@@ -67,10 +68,29 @@ enum class Links {
     Replace,
 };
 
+/// What a file has beside its bytes.
+struct FileAttributes {
+    mode_t mode = 0;
+    uid_t owner = 0;
+    gid_t group = 0;
+    ExtendedAttributes extended;
+
+    bool operator==(FileAttributes const& other) const {
+        return mode == other.mode && owner == other.owner && group == other.group &&
+               extended == other.extended;
+    }
+};
+
+/// Those of an open file.
+/// @return nothing where the file system fails; `errno` says why
+std::optional<FileAttributes> ReadAttributes(int file);
+
 struct Replacing {
     Links links = Links::Follow;
     /// Of a file that did not exist, whatever the umask is.
     mode_t newMode = 0644;
+    /// What the file gets, whatever the target has: for a file that becomes what it was.
+    std::optional<FileAttributes> attributes = std::nullopt;
 };
 
 /// The new file beside its target: complete and durable, with the mode (07777), the owner, the
@@ -105,7 +125,7 @@ public:
     void Commit();
 
 private:
-    void Fill(std::string_view text, mode_t newMode);
+    void Fill(std::string_view text, Replacing const& how);
 
     std::string _path;
     std::string _target;

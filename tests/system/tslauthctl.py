@@ -79,6 +79,16 @@ def follow():
     (state / "joined").write_text("CN=node,CN=Computers,DC=example,DC=test\n")
 
 
+def have_management_address(case):
+    """Gives the host an interface for as long as the test lasts."""
+    case.addCleanup(subprocess.run, ["ip", "link", "delete", "management"])
+    for command in ("ip link add management type dummy 2>/dev/null || "
+                    "ip link add management type veth",
+                    "ip address add 192.0.2.10/24 dev management",
+                    "ip link set management up", "ip route add default via 192.0.2.254"):
+        subprocess.run(["sh", "-c", command], check=True)
+
+
 SCRIPTS = pathlib.Path("/run/directed")
 
 

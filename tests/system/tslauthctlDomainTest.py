@@ -158,16 +158,8 @@ class Membership(Case):
                        input=b"wrong\n")
         self.assertEqual(CREDENTIALS, document["exit"])
 
-    def management_address(self):
-        self.addCleanup(subprocess.run, ["ip", "link", "delete", "management"])
-        command("sh", "-c", "ip link add management type dummy 2>/dev/null || "
-                            "ip link add management type veth")
-        command("ip", "address", "add", "192.0.2.10/24", "dev", "management")
-        command("ip", "link", "set", "management", "up")
-        command("ip", "route", "add", "default", "via", "192.0.2.254")
-
     def test_a_failed_join_puts_the_name_resolution_back(self):
-        self.management_address()
+        have_management_address(self)
         HOSTS.write_text("127.0.0.1 localhost\n127.0.1.1 node.old.test node\n"
                          "192.0.2.7 example.test\n192.0.2.10 files.test node\n")
         before = HOSTS.read_bytes(), RESOLV.read_bytes()
@@ -191,7 +183,7 @@ class Membership(Case):
         self.assertEqual(b"The host is parted from its domain.\n", run("part").stdout)
 
     def test_a_join_repairs_the_name_resolution(self):
-        self.management_address()
+        have_management_address(self)
         # The names differ, so that the domain becomes a search domain, since it resolves.
         HOSTS.write_text("127.0.0.1 localhost\n127.0.1.1 node.old.test node\n"
                          "192.0.2.7 example.test\n")

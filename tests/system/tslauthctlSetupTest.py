@@ -99,7 +99,7 @@ def populate():
 def leave_stock_host():
     """A host where nobody has set up anything."""
     shutil.rmtree("/etc/tessel", ignore_errors=True)
-    shutil.rmtree(STATE, ignore_errors=True)
+    shutil.rmtree(STATE.parent, ignore_errors=True)
     PAM.unlink(missing_ok=True)
     NSS.write_text(STOCK_NSS)
     pathlib.Path("/run/asked").unlink(missing_ok=True)
@@ -227,6 +227,27 @@ class SetupTest(unittest.TestCase):
         self.assertNotIn("samba-service", self.words())
         self.assertEqual(ask("unsetup")["exit"], DONE)
         self.assertEqual(etc(), self.before)
+
+    def test_setting_up_and_taking_it_back_can_be_undone(self):
+        self.set_up()
+        ready = etc()
+        self.assertEqual(ask("undo")["exit"], DONE)
+        self.assertEqual(etc(), self.before)
+        self.assertFalse(LINK.exists())
+        self.assertFalse(STATE.exists())
+        self.assertTrue(log_in("lena", "authenticate", "acct_mgmt", password="local secret"))
+        self.set_up_and_activate()
+        self.assertEqual(ask("permit", USER)["exit"], DONE)
+        active = etc()
+        self.assertEqual(ask("unsetup")["exit"], DONE)
+        leaving = [change["number"] for change in ask("history")["history"]
+                   if change["command"].startswith("unsetup")]
+        self.assertEqual(len(leaving), 2, "the store's deactivation is a change of its own")
+        self.assertEqual(ask("undo", str(leaving[0]))["exit"], DONE)
+        self.assertEqual(etc(), active)
+        self.assertTrue(log_in(USER, "authenticate", "acct_mgmt"))
+        self.local_users_log_in(SERVICE)
+        self.assertNotEqual(active, ready)
 
     def test_what_was_changed_since_stays_and_is_told(self):
         self.set_up()

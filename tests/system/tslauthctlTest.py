@@ -256,8 +256,9 @@ class Activate(Case):
         self.assertEqual([str(RECORD)], document["changed"])
         self.assertIn("None", RECORD.read_text())
 
-    def test_an_active_store_is_told_where_its_entries_cannot_be_recorded(self):
+    def test_a_change_that_cannot_be_remembered_is_not_made(self):
         ask("activate", AD)
+        before = texts()
         folder = pathlib.Path("/var/lib/tslauth")
         subprocess.run(["mount", "--bind", folder, folder], check=True)
         subprocess.run(["mount", "-o", "remount,bind,ro", folder], check=True)
@@ -266,11 +267,12 @@ class Activate(Case):
         finally:
             subprocess.run(["umount", folder], check=True)
         self.assertEqual(FAILURE, document["exit"])
-        self.assertIn("'None' is active, but: ", document["error"]["message"])
-        self.assertEqual({str(path) for path in FILES}, set(document["changed"]))
+        self.assertIn("Nothing was changed", document["error"]["message"])
+        self.assertEqual(before, texts())
         self.assertEqual(DONE, ask("activate", "None")["exit"])
 
-    def test_a_failure_in_the_middle_names_what_was_changed(self):
+    def test_what_was_written_before_a_failure_is_put_back(self):
+        before = texts()
         # The folder of the record takes no new file; those of the others do.
         subprocess.run(["mount", "--bind", RECORD.parent, RECORD.parent], check=True)
         subprocess.run(["mount", "-o", "remount,bind,ro", RECORD.parent], check=True)
@@ -280,8 +282,10 @@ class Activate(Case):
             subprocess.run(["umount", RECORD.parent], check=True)
         self.assertEqual(REFUSED, document["exit"])
         self.assertEqual("tessel::authentication::IOError", document["error"]["exception"])
-        self.assertEqual([str(PAM), str(NSS)], document["changed"])
-        self.assertEqual(DRIFT, ask("status")["exit"])
+        self.assertEqual([], document["changed"])
+        self.assertLessEqual({str(PAM), str(NSS)}, set(document["put_back"]))
+        self.assertEqual(before, texts())
+        self.assertEqual(DONE, ask("status")["exit"])
 
     def test_it_wants_root(self):
         document = self.unchanged("activate", AD, preexec_fn=nobody)

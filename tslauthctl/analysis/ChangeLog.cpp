@@ -50,6 +50,8 @@ std::vector<std::string> WithoutPasswords(std::vector<std::string> arguments) {
     return arguments;
 }
 
+} // namespace
+
 Caller ThisCaller() {
     Caller caller;
     caller.uid = getuid();
@@ -64,16 +66,22 @@ Caller ThisCaller() {
     return caller;
 }
 
-} // namespace
-
-std::string LineFor(std::vector<std::string> const& arguments, std::string const& outcome,
-                    Caller const& caller) {
+std::string Shown(std::vector<std::string> const& arguments) {
     std::string command;
     for (auto const& argument : WithoutPasswords(arguments)) {
         bool const plain = !argument.empty() && argument.find_first_of(" \t'") == std::string::npos;
         command += (command.empty() ? "" : " ") + (plain ? argument : "'" + argument + "'");
     }
-    auto line = "change=" + Quoted(command) + " outcome=" + outcome +
+    return command;
+}
+
+std::string ShownCommand() {
+    return Shown(Command());
+}
+
+std::string LineFor(std::vector<std::string> const& arguments, std::string const& outcome,
+                    Caller const& caller) {
+    auto line = "change=" + Quoted(Shown(arguments)) + " outcome=" + outcome +
                 " uid=" + std::to_string(caller.uid) +
                 " login_uid=" + (caller.loginUid.empty() ? "none" : caller.loginUid);
     if (!caller.sudoUser.empty()) {

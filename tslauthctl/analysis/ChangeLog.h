@@ -24,6 +24,13 @@ std::string LineFor(std::vector<std::string> const& arguments, std::string const
 /// Keeps the command's arguments for the line.
 void SetCommand(std::vector<std::string> arguments);
 
+/// The arguments as they may be shown, with quotes where one has blanks.
+std::string Shown(std::vector<std::string> const& arguments);
+/// The same for those that are kept.
+std::string ShownCommand();
+
+Caller ThisCaller();
+
 /// From now on the command changes the host, or is about to.
 void Begin() noexcept;
 

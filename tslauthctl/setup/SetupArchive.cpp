@@ -16,10 +16,6 @@ std::string DocumentPath() {
     return std::string(Paths::SetupRecord) + "/record.json";
 }
 
-std::string SetUpCopy(std::string const& path) {
-    return std::string(Paths::SetupRecord) + "/after" + path;
-}
-
 void Keep(std::string const& path, std::string const& text) {
     for (auto const& folder : MissingFolders(path)) {
         MakeFolder(folder);
@@ -84,6 +80,19 @@ void RemoveSetupRecord() noexcept {
 
 std::string KeptOriginal(std::string const& path) {
     return std::string(Paths::SetupRecord) + "/before" + path;
+}
+
+std::string SetUpCopy(std::string const& path) {
+    return std::string(Paths::SetupRecord) + "/after" + path;
+}
+
+std::vector<std::string> SetupRecordPaths() {
+    std::vector<std::string> paths = {DocumentPath()};
+    for (auto const& path : SetupPaths()) {
+        paths.push_back(KeptOriginal(path));
+        paths.push_back(SetUpCopy(path));
+    }
+    return paths;
 }
 
 } // namespace tessel::tslauthctl

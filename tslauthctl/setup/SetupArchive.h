@@ -6,6 +6,7 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 /// Where the record of a host that was set up is kept, as an administrator can read it: one
 /// document, and the files below "before" and "after" under their own paths.
@@ -25,8 +26,12 @@ void RecordChange(std::string const& path, std::string const& text);
 
 void RemoveSetupRecord() noexcept;
 
-/// Where the text that a file had before is kept.
+/// Where the text that a file had before is kept, and what has become of it.
 std::string KeptOriginal(std::string const& path);
+std::string SetUpCopy(std::string const& path);
+
+/// Every path that the record may have.
+std::vector<std::string> SetupRecordPaths();
 
 } // namespace tessel::tslauthctl
 

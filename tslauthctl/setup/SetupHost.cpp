@@ -206,6 +206,11 @@ SetupFacts ReadSetupFacts(std::string const& provider) {
     return facts;
 }
 
+std::vector<std::string> PathsOfJoinOnHost() {
+    auto const provider = ProviderName();
+    return provider.empty() ? std::vector<std::string>() : ReadProvidersFile(provider).joinPaths;
+}
+
 std::optional<std::string> TextOnHost(std::string const& path) {
     try {
         return base::ReadFile(path);

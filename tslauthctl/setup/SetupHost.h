@@ -15,6 +15,10 @@ namespace tessel::tslauthctl {
 ///     a file cannot be read
 SetupFacts ReadSetupFacts(std::string const& provider);
 
+/// What a join of the configured provider writes, as far as that says so.
+/// @throws Failure
+std::vector<std::string> PathsOfJoinOnHost();
+
 /// A file's text; nothing where there is none.
 /// @throws Failure where it cannot be read
 std::optional<std::string> TextOnHost(std::string const& path);

@@ -210,6 +210,11 @@ ProviderSetup ReadProviderSetup(std::string_view text) {
     setup.replacedProfile = ValueOf("replaced-profile", text).value_or("");
     setup.replacedModule = ValueOf("replaced-module", text).value_or("");
     setup.replacedService = ValueOf("replaced-service", text).value_or("");
+    base::ForEachAssignment(text, [&](base::Assignment const& assignment) {
+        if (assignment.key == "join-writes") {
+            setup.joinPaths.emplace_back(assignment.value);
+        }
+    });
     return setup;
 }
 

@@ -27,10 +27,12 @@ struct ProviderSetup {
     std::string replacedModule;
     /// A service that is taken out of the name-service switch; empty for none.
     std::string replacedService;
+    /// What a join writes beside the files that every join does, none of them with a secret.
+    std::vector<std::string> joinPaths = {};
 };
 
-/// @param text lines of `policy-FACILITY`, `replaced-profile`, `replaced-module` and
-///        `replaced-service`
+/// @param text lines of `policy-FACILITY`, `replaced-profile`, `replaced-module`,
+///        `replaced-service` and `join-writes`, which may stand there more than once
 /// @throws base::KeyValueError
 ProviderSetup ReadProviderSetup(std::string_view text);
 

@@ -3,6 +3,7 @@
 #include "analysis/HostFile.h"
 #include "analysis/HostPlan.h"
 #include "analysis/KnownStores.h"
+#include "history/HistoryPaths.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
@@ -13,6 +14,8 @@
 namespace tessel::tslauthctl {
 
 namespace {
+
+using authentication::UnknownRemoteAuthenticationStoreException;
 
 /// The files that are no longer what they were when the plan was made.
 std::vector<std::string> ChangedFiles(HostPlan const& plan) {
@@ -41,7 +44,7 @@ ExitCode FinishRecord(HostPlan const& plan, Console& console) {
 ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console) {
     RequireStore(store);
     RequireRoot("activate");
-    HostChange const change(console);
+    HostChange change(console);
     auto const plan = MakeHostPlan(store);
     auto& document = console.Document();
     document["changed"] = nlohmann::json::array();
@@ -84,15 +87,33 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         console.ErrorDetail("see 'tslauthctl prepare', or give --accept-loss");
         return ExitCode::loss;
     }
-    RecordInserted(plan.insertedMeanwhile);
+    auto code = ExitCode::done;
     try {
-        plan.steps.Execute();
+        std::exception_ptr refusal;
+        change.Write("activate", PathsOfActivation(), [&] {
+            RecordInserted(plan.insertedMeanwhile);
+            try {
+                plan.steps.Execute();
+            } catch (UnknownRemoteAuthenticationStoreException const&) {
+                if (!plan.refusedAfterwards) {
+                    throw;
+                }
+                refusal = std::current_exception(); // what was written is the way away
+                return;
+            }
+            code = FinishRecord(plan, console);
+        });
+        if (refusal) {
+            std::rethrow_exception(refusal);
+        }
+    } catch (Failure const&) {
+        throw;
     } catch (std::exception const& e) {
         console.Error(Refused(e));
         auto const changed = ChangedFiles(plan);
         document["changed"] = changed;
         for (auto const& path : changed) {
-            console.ErrorDetail("changed before that: " + path);
+            console.ErrorDetail("changed all the same: " + path);
         }
         if (changed.empty()) {
             console.ErrorDetail("nothing was changed");
@@ -114,7 +135,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
                  (changed.empty() ? "nothing had to be changed"
                                   : base::AsciiText::Counted(changed.size(), "file") + " changed") +
                  ".");
-    return FinishRecord(plan, console);
+    return code;
 }
 
 } // namespace tessel::tslauthctl

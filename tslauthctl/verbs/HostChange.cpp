@@ -2,16 +2,52 @@
 #include "verbs/HostChange.h"
 
 #include "analysis/ChangeLog.h"
+#include "history/HistoryArchive.h"
+#include "history/PathOnHost.h"
+#include "history/UndoPlan.h"
 #include "terminal/Console.h"
+#include "terminal/EscapedText.h"
+#include "terminal/HeldSignals.h"
 
 #include <tslauth/Exceptions.h>
 
+#include <base/FileError.h>
+
+#include <ctime>
 #include <string>
 #include <unistd.h>
 
 namespace tessel::tslauthctl {
 
-HostChange::HostChange(Console& console) try {
+namespace {
+
+std::string Now() {
+    std::time_t const now = std::time(nullptr);
+    std::tm parts = {};
+    gmtime_r(&now, &parts);
+    char text[sizeof "2026-11-22T01:30:00Z"];
+    return {text, std::strftime(text, sizeof text, "%Y-%m-%dT%H:%M:%SZ", &parts)};
+}
+
+Snapshot Kept(std::string const& verb, std::vector<std::string> const& paths) {
+    Snapshot snapshot;
+    snapshot.when = Now();
+    snapshot.verb = verb;
+    snapshot.command = Escaped(ChangeLog::ShownCommand());
+    snapshot.caller = ChangeLog::ThisCaller();
+    MakeHistoryFolder(); // not part of what the host was
+    try {
+        snapshot.before = StatesOnHost(paths);
+    } catch (base::FileError const& e) {
+        throw Failure(ExitCode::failure, std::string("Nothing was changed: ") + e.what());
+    }
+    KeepSnapshot(snapshot);
+    return snapshot;
+}
+
+} // namespace
+
+HostChange::HostChange(Console& console) try : _console(console) {
     if (!_lock.TryLock()) {
         console.Waiting("waiting for another tslauthctl to finish ...");
         _lock.Lock();
@@ -19,6 +55,68 @@ HostChange::HostChange(Console& console) try {
     ChangeLog::Begin();
 } catch (authentication::IOError const& e) {
     throw Failure(ExitCode::failure, e.what());
+}
+
+void HostChange::Write(std::string const& verb, std::vector<std::string> const& paths,
+                       std::function<void()> const& write) {
+    HoldSignals();
+    auto const snapshot = Kept(verb, paths);
+    try {
+        write();
+    } catch (...) {
+        PutBack(snapshot);
+        Conclude(snapshot);
+        throw;
+    }
+    Conclude(snapshot);
+}
+
+void HostChange::Follow(std::string const& verb, std::vector<std::string> const& paths,
+                        std::function<void()> const& change) {
+    auto const snapshot = Kept(verb, paths);
+    try {
+        change();
+    } catch (...) {
+        Conclude(snapshot);
+        throw;
+    }
+    Conclude(snapshot);
+}
+
+void HostChange::PutBack(Snapshot const& snapshot) {
+    auto& document = _console.Document();
+    auto const put = [&](UndoStep const& step) {
+        try {
+            PutStateOnHost(step.path, step.wanted);
+            document["put_back"].push_back(step.path);
+            _console.ErrorDetail("put back as it was: " + step.path);
+        } catch (std::exception const& e) {
+            document["not_put_back"].push_back(step.path);
+            _console.ErrorDetail("could not be put back: " + step.path + ": " + e.what());
+        }
+    };
+    try {
+        for (auto const& step : PlanUndo(snapshot.before, CurrentOf(snapshot.before), {})) {
+            put(step);
+        }
+    } catch (std::exception const& e) {
+        _console.ErrorDetail(std::string("what was written before that could not be put back: ") +
+                             e.what());
+    }
+}
+
+void HostChange::Conclude(Snapshot snapshot) {
+    try {
+        snapshot.after = CurrentOf(snapshot.before);
+        if (snapshot.Changed().empty()) {
+            DropSnapshot(snapshot);
+        } else {
+            FinishSnapshot(snapshot);
+        }
+    } catch (std::exception const& e) {
+        // The change stands, and what the host was before is kept.
+        _console.Warning(e.what());
+    }
 }
 
 void RequireRoot(char const* what) {

@@ -2,6 +2,8 @@
 #include "analysis/Failures.h"
 #include "analysis/JoinedDomain.h"
 #include "analysis/NameResolution.h"
+#include "history/HistoryPaths.h"
+#include "setup/SetupHost.h"
 #include "terminal/Password.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
@@ -284,13 +286,15 @@ ExitCode RunJoin(JoinArguments const& arguments, Limit limit, Console& console) 
     }
     // Before the lock is taken: whoever has to type it may take their time.
     auto const password = IsCAM(arguments) ? nullptr : AskForPassword(arguments);
-    HostChange const change(console);
+    HostChange change(console);
     console.Detail("the provider is asked to join the host");
-    if (IsCAM(arguments)) {
-        JoinThroughServer(arguments, store, console);
-    } else {
-        JoinWithPassword(arguments, store, password, console);
-    }
+    change.Follow("join", PathsOfMembership(PathsOfJoinOnHost()), [&] {
+        if (IsCAM(arguments)) {
+            JoinThroughServer(arguments, store, console);
+        } else {
+            JoinWithPassword(arguments, store, password, console);
+        }
+    });
     console.Document()["joined"] = true;
     return ExitCode::done;
 }

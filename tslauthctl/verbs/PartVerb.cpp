@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "analysis/Failures.h"
 #include "analysis/JoinedDomain.h"
+#include "history/HistoryPaths.h"
+#include "setup/SetupHost.h"
 #include "terminal/Password.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
@@ -36,11 +38,13 @@ ExitCode RunPart(AccountArguments const& arguments, Limit limit, Console& consol
     auto& document = console.Document();
     document["parted"] = false;
     auto const part = PartCall(arguments, limit);
-    HostChange const change(console);
+    HostChange change(console);
     OnJoinedHost(console, limit, [&] {
-        Explaining(arguments.user ? Account::given : Account::none, [&] {
-            Wait(console,
-                 Start("the provider to part the host from its domain", std::nullopt, part));
+        change.Follow("part", PathsOfMembership(PathsOfJoinOnHost()), [&] {
+            Explaining(arguments.user ? Account::given : Account::none, [&] {
+                Wait(console,
+                     Start("the provider to part the host from its domain", std::nullopt, part));
+            });
         });
     });
     document["parted"] = true;

@@ -3,6 +3,7 @@
 #include "access/NameLookup.h"
 #include "analysis/ChangeLog.h"
 #include "analysis/JoinedDomain.h"
+#include "history/HistoryPaths.h"
 #include "setup/SetupArchive.h"
 #include "setup/SetupHost.h"
 #include "setup/SetupPaths.h"
@@ -161,19 +162,22 @@ ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& c
 }
 
 ExitCode RunAccess(AccessArguments const& arguments, Limit limit, Console& console) {
-    RequireRoot(arguments.denies ? "deny" : "permit");
+    char const* const verb = arguments.denies ? "deny" : "permit";
+    RequireRoot(verb);
     ChangeLog::Begin();
     // Not while everybody else has to wait for the answers.
     auto const subjects = SubjectsOf(arguments, limit, console);
-    HostChange const change(console);
+    HostChange change(console);
     auto const before = ReadRules();
     auto const after = Preview(before, arguments, subjects, console);
     if (before == after) {
         console.Line("Nothing had to be changed.");
         return ExitCode::done;
     }
-    PutOnHost(Paths::AccessRules, after);
-    RecordChange(Paths::AccessRules, after);
+    change.Write(verb, PathsOfAccess(), [&] {
+        PutOnHost(Paths::AccessRules, after);
+        RecordChange(Paths::AccessRules, after);
+    });
     return ExitCode::done;
 }
 

@@ -13,6 +13,7 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace tessel::tslauthctl {
@@ -21,34 +22,24 @@ namespace {
 
 using namespace authentication;
 
-/// Keeps the file as it is under a name beside it: FILE.tslauth-orig, or with a number behind it
-/// where that is taken. A second name for the same file, so that owner, mode and everything else
-/// stay its own.
-std::string KeepOriginal(std::string const& path) {
-    for (int number = 0;; ++number) {
-        auto kept = path + ".tslauth-orig";
-        if (number > 0) {
-            kept += "." + std::to_string(number);
-        }
-        if (linkat(AT_FDCWD, path.c_str(), AT_FDCWD, kept.c_str(), AT_SYMLINK_FOLLOW) == 0) {
-            return kept;
-        }
-        if (int const error = errno; error != EEXIST) {
-            throw IOError("Cannot keep the original as '" + kept + "': " + base::SystemText(error));
-        }
+/// A name for the original beside the file: FILE.tslauth-orig, or with a number behind it where that
+/// is taken.
+std::string NameForOriginal(std::string const& path) {
+    auto const first = path + ".tslauth-orig";
+    auto name = first;
+    struct stat status = {};
+    for (int number = 1; lstat(name.c_str(), &status) == 0; ++number) {
+        name = first + "." + std::to_string(number);
     }
+    return name;
 }
 
-/// Replaces the file, which stays what it was in all but its text.
-/// @return the name of the original
-std::string Write(std::string const& path, std::string const& text) {
-    auto kept = KeepOriginal(path);
-    try {
-        base::ReplaceFile(path, text);
-    } catch (base::FileError const& e) {
-        throw IOError(e.what());
+/// A second name for the same file, so that owner, mode and everything else stay its own.
+void KeepOriginal(std::string const& path, std::string const& name) {
+    if (linkat(AT_FDCWD, path.c_str(), AT_FDCWD, name.c_str(), AT_SYMLINK_FOLLOW) != 0) {
+        int const error = errno;
+        throw IOError("Cannot keep the original as '" + name + "': " + base::SystemText(error));
     }
-    return kept;
 }
 
 nlohmann::json Described(std::vector<PreparedLine> const& lines) {
@@ -77,13 +68,35 @@ struct PreparedFile {
     std::string path;
     std::string before;
     Prepared prepared;
+    /// Where what it was is kept; empty where it is not written.
+    std::string original;
 
     bool Changes() const {
         return prepared.text != before;
     }
 };
 
-void Describe(PreparedFile const& file, bool write, Console& console) {
+/// Replaces the files that change, which stay what they were in all but their texts.
+void Write(std::vector<PreparedFile>& files, HostChange& change) {
+    std::vector<std::string> paths;
+    for (auto& file : files) {
+        if (file.Changes()) {
+            file.original = NameForOriginal(file.path);
+            paths.push_back(file.path);
+            paths.push_back(file.original);
+        }
+    }
+    change.Write("prepare", paths, [&] {
+        for (auto const& file : files) {
+            if (file.Changes()) {
+                KeepOriginal(file.path, file.original);
+                base::ReplaceFile(file.path, file.prepared.text);
+            }
+        }
+    });
+}
+
+void Describe(PreparedFile const& file, Console& console) {
     auto const diff = UnifiedDiff(file.path, file.before, file.prepared.text);
     console.Diff(diff);
     for (auto const& edit : file.prepared.edits) {
@@ -95,9 +108,9 @@ void Describe(PreparedFile const& file, bool write, Console& console) {
                         ": " + finding.reason);
     }
     nlohmann::json original = nullptr;
-    if (write && file.Changes()) {
-        original = Write(file.path, file.prepared.text);
-        console.Line("changed " + file.path + "; the original is " + original.get<std::string>());
+    if (!file.original.empty()) {
+        original = file.original;
+        console.Line("changed " + file.path + "; the original is " + file.original);
     }
     console.Document()["files"].push_back({{"path", file.path},
                                            {"changed", file.Changes()},
@@ -117,13 +130,14 @@ ProviderEntries EntriesToCarry(Console& console) {
     }
 }
 
-ExitCode Prepare(bool write, bool acceptLoss, Console& console) {
+/// @param change of the host; null where it is only shown
+ExitCode Prepare(HostChange* change, bool acceptLoss, Console& console) {
     auto const entries = EntriesToCarry(console);
     auto const policy = ReadHostFile(Paths::PAMPolicy);
     auto const services = ReadHostFile(Paths::NSSConfiguration);
-    PreparedFile const files[] = {
-        {Paths::PAMPolicy, policy, PreparePAM(policy, entries, HostFileOrNothing, acceptLoss)},
-        {Paths::NSSConfiguration, services, PrepareNSS(services, entries, acceptLoss)}};
+    std::vector<PreparedFile> files = {
+        {Paths::PAMPolicy, policy, PreparePAM(policy, entries, HostFileOrNothing, acceptLoss), {}},
+        {Paths::NSSConfiguration, services, PrepareNSS(services, entries, acceptLoss), {}}};
     bool changes = false;
     bool loses = false;
     for (auto const& file : files) {
@@ -133,13 +147,17 @@ ExitCode Prepare(bool write, bool acceptLoss, Console& console) {
     // A file that cannot be carried anyhow is not changed half way.
     bool const refused = loses && !acceptLoss;
     auto& document = console.Document();
-    document["written"] = write && !refused;
+    document["written"] = false;
     document["files"] = nlohmann::json::array();
+    if (change != nullptr && changes && !refused) {
+        Write(files, *change);
+    }
+    document["written"] = change != nullptr && !refused;
     for (auto const& file : files) {
-        Describe(file, write && !refused, console);
+        Describe(file, console);
     }
     if (refused) {
-        if (write) {
+        if (change != nullptr) {
             console.Line(
                 "Nothing was changed. With --accept-loss the files are edited all the same.");
         }
@@ -148,18 +166,18 @@ ExitCode Prepare(bool write, bool acceptLoss, Console& console) {
     if (!changes) {
         console.Line("Nothing has to be prepared.");
     }
-    return changes && !write ? ExitCode::changes : ExitCode::done;
+    return changes && change == nullptr ? ExitCode::changes : ExitCode::done;
 }
 
 } // namespace
 
 ExitCode RunPrepare(bool write, bool acceptLoss, Console& console) {
     if (!write) {
-        return Prepare(write, acceptLoss, console);
+        return Prepare(nullptr, acceptLoss, console);
     }
     RequireRoot("prepare --write");
-    HostChange const change(console);
-    return Prepare(write, acceptLoss, console);
+    HostChange change(console);
+    return Prepare(&change, acceptLoss, console);
 }
 
 } // namespace tessel::tslauthctl

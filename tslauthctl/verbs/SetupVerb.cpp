@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "access/AccessRules.h"
 #include "analysis/KnownStores.h"
+#include "history/HistoryPaths.h"
 #include "setup/SetupArchive.h"
 #include "setup/SetupHost.h"
 #include "setup/SetupPaths.h"
@@ -293,6 +294,25 @@ ExitCode Conclude(std::vector<FileUndo> const& files, Console& console) {
     return ExitCode::done;
 }
 
+/// Makes the host what it was.
+ExitCode TakeBack(SetupRecord const& record, Console& console) {
+    auto undoing = PlanUndoing(record);
+    // First of all, so that no service ever includes a policy that is gone.
+    TakeServicesBack(record, undoing);
+    KeepPolicyFor(FilesThatFollow(PoliciesOnHost()), undoing, console);
+    for (std::size_t i = record.files.size(); i > 0; --i) {
+        Undo(record.files[i - 1], undoing.files[i - 1]);
+    }
+    for (auto const& link : record.links) {
+        RemoveFromHost(link);
+    }
+    for (auto folder = record.folders.rbegin(); folder != record.folders.rend(); ++folder) {
+        RemoveEmptyFolder(*folder);
+    }
+    Describe(undoing.files, console);
+    return Conclude(undoing.files, console);
+}
+
 bool IsNoneActive() {
     try {
         return authentication::RecordedStore() == NoStore;
@@ -321,12 +341,12 @@ ExitCode RunPlanSetup(std::string const& provider, Console& console) {
 
 ExitCode RunSetup(std::string const& provider, Console& console) {
     RequireRoot("setup");
-    HostChange const change(console);
+    HostChange change(console);
     auto const facts = ReadSetupFacts(provider);
     auto const plan = MakeSetupPlan(facts);
     Describe(plan, provider, console);
     if (plan.Changes()) {
-        CarryOut(plan, facts);
+        change.Write("setup", PathsOfSetup(), [&] { CarryOut(plan, facts); });
     }
     for (auto const& file : plan.files) {
         if (file.Changes()) {
@@ -370,7 +390,7 @@ ExitCode RunUnsetup(Console& console) {
             return left == ExitCode::loss ? ExitCode::refused : left;
         }
     }
-    HostChange const change(console);
+    HostChange change(console);
     if (!IsNoneActive()) {
         throw Failure(ExitCode::refused, "Somebody has activated a store meanwhile");
     }
@@ -380,21 +400,9 @@ ExitCode RunUnsetup(Console& console) {
         console.Line(notSetUp);
         return ExitCode::done;
     }
-    auto undoing = PlanUndoing(*record);
-    // First of all, so that no service ever includes a policy that is gone.
-    TakeServicesBack(*record, undoing);
-    KeepPolicyFor(FilesThatFollow(PoliciesOnHost()), undoing, console);
-    for (std::size_t i = record->files.size(); i > 0; --i) {
-        Undo(record->files[i - 1], undoing.files[i - 1]);
-    }
-    for (auto const& link : record->links) {
-        RemoveFromHost(link);
-    }
-    for (auto folder = record->folders.rbegin(); folder != record->folders.rend(); ++folder) {
-        RemoveEmptyFolder(*folder);
-    }
-    Describe(undoing.files, console);
-    return Conclude(undoing.files, console);
+    auto code = ExitCode::done;
+    change.Write("unsetup", PathsOfSetup(), [&] { code = TakeBack(*record, console); });
+    return code;
 }
 
 } // namespace tessel::tslauthctl

@@ -16,6 +16,7 @@
 namespace tessel::tslauthctl {
 
 struct HostPlan;
+struct PathState;
 
 ExitCode RunStores(Console& console);
 struct StatusArguments {
@@ -47,6 +48,20 @@ struct AccessArguments {
 ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& console);
 ExitCode RunAccess(AccessArguments const& arguments, Limit limit, Console& console);
 ExitCode RunListAccess(Console& console);
+
+/// What was changed, oldest first.
+ExitCode RunHistory(Console& console);
+ExitCode RunShowHistory(unsigned number, Console& console);
+
+struct UndoArguments {
+    /// 0 for the newest change.
+    unsigned number = 0;
+    bool dryRun = false;
+    /// Also what others have edited since, and the files of a membership.
+    bool force = false;
+};
+
+ExitCode RunUndo(UndoArguments const& arguments, Console& console);
 
 ExitCode RunPrepare(bool write, bool acceptLoss, Console& console);
 
@@ -80,6 +95,11 @@ ExitCode RunCAMImport(std::string const& server, std::string const& file, Limit 
                       Console& console);
 ExitCode RunCAMList(Console& console);
 ExitCode RunCAMDomain(std::string const& server, Limit limit, Console& console);
+
+/// What became of one path, as a diff and in words.
+/// @param described gets "path", "before", "after" and "diff"
+void DescribePath(std::string const& path, PathState const& before, PathState const& after,
+                  nlohmann::json& described, Console& console);
 
 /// What `plan` shows of a plan, and `activate` before it refuses: JSON fields "store", "recorded",
 /// "files" and "refusal".

@@ -26,7 +26,8 @@ protected:
     bool Copy() const {
         Descriptor const source(::open(from.c_str(), O_RDONLY | O_CLOEXEC));
         Descriptor const target(::open(to.c_str(), O_WRONLY | O_CLOEXEC));
-        return CopyExtendedAttributes(source.Get(), target.Get());
+        auto const wanted = ReadExtendedAttributes(source.Get());
+        return wanted && SetExtendedAttributes(target.Get(), *wanted);
     }
 
     TemporaryFolder const folder;

@@ -9,6 +9,7 @@
 
 #include <cerrno>
 #include <filesystem>
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <map>
 #include <stdexcept>
@@ -201,6 +202,19 @@ TEST_F(WholeFileTest, ANewFileHasTheModeThatIsAskedFor) {
     EXPECT_EQ(0640U, ModeOf(target));
     ReplaceFile(target, "newer", {Links::Follow, 0600});
     EXPECT_EQ(0640U, ModeOf(target)) << "it is new no more";
+}
+
+TEST_F(WholeFileTest, AFileThatBecomesWhatItWasHasTheAttributesItHad) {
+    SetContents(target, "was");
+    ASSERT_EQ(0, ::chmod(target.c_str(), 0604));
+    bool const lists = attributes::Set(target, attributes::AccessList, attributes::ListFor(54321));
+    auto const was = ReadAttributes(Descriptor(::open(target.c_str(), O_RDONLY)).Get());
+    ASSERT_TRUE(was);
+    std::filesystem::remove(target);
+    SetContents(target, "is");
+    ReplaceFile(target, "was", {Links::Replace, 0600, *was});
+    EXPECT_EQ(*was, *ReadAttributes(Descriptor(::open(target.c_str(), O_RDONLY)).Get()));
+    EXPECT_EQ(lists ? 1U : 0U, attributes::Of(target).count(attributes::AccessList));
 }
 
 TEST_F(WholeFileTest, ANewFileHasNoListOfItsFolders) {
