@@ -245,6 +245,15 @@ void FileReplacement::Commit() {
     SyncFolderOf(_target);
 }
 
+void MakeFile(std::string const& path, std::string_view text, mode_t mode) {
+    Descriptor const file(
+        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC | O_NOCTTY, mode));
+    if (!file || !WriteAll(file.Get(), text) || ::fchmod(file.Get(), mode) != 0 ||
+        ::fsync(file.Get()) != 0) {
+        throw FileError("make", path, errno);
+    }
+}
+
 void ReplaceFile(std::string const& path, std::string_view text, Replacing how) {
     FileReplacement(path, text, how).Commit();
 }

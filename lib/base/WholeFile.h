@@ -134,6 +134,12 @@ private:
     Descriptor _file;
 };
 
+/// Makes a file where there is none, durable but for its name: for a folder that nobody looks into
+/// before `SyncFolderOf`.
+/// @param mode whatever the umask is
+/// @throws FileError "Cannot make '" + path + "': " + the reason; a file may be left
+void MakeFile(std::string const& path, std::string_view text, mode_t mode);
+
 inline constexpr char TemporaryPrefix[] = ".tslauth-";
 
 /// `FileReplacement` in one call.

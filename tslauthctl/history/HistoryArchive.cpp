@@ -78,15 +78,15 @@ void MakeFoldersAbove(std::string const& path, std::string const& folder,
 }
 
 void WriteTexts(std::string const& folder, PathStates const& states) {
-    std::set<std::string> made;
+    std::set<std::string> made = {folder};
     for (auto const& [path, state] : states) {
         if (state.kind == Kind::file) {
             MakeFoldersAbove(folder + path, folder, made);
-            base::ReplaceFile(folder + path, state.text, {base::Links::Replace, forRoot});
+            base::MakeFile(folder + path, state.text, forRoot);
         }
     }
     for (auto const& each : made) {
-        base::SyncFolderOf(each);
+        base::SyncFolderOf(each + "/");
     }
 }
 
@@ -137,8 +137,8 @@ void Write(Snapshot const& snapshot, std::string const& folder) {
     MakeFolderForRoot(folder);
     MakeFolderForRoot(folder + before);
     WriteTexts(folder + before, snapshot.before);
-    base::ReplaceFile(folder + document, Described(snapshot).dump(2) + "\n",
-                      {base::Links::Replace, forRoot});
+    base::MakeFile(folder + document, Described(snapshot).dump(2) + "\n", forRoot);
+    base::SyncFolderOf(folder + document);
     auto const place = FolderOf(snapshot.number);
     if (::rename(folder.c_str(), place.c_str()) != 0) {
         throw base::FileError("make", place, errno);

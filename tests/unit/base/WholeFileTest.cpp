@@ -217,6 +217,15 @@ TEST_F(WholeFileTest, AFileThatBecomesWhatItWasHasTheAttributesItHad) {
     EXPECT_EQ(lists ? 1U : 0U, attributes::Of(target).count(attributes::AccessList));
 }
 
+TEST_F(WholeFileTest, AFileIsMadeWhereThereIsNone) {
+    MakeFile(target, "new", 0640);
+    EXPECT_EQ("new", Contents(target));
+    EXPECT_EQ(0640U, ModeOf(target));
+    EXPECT_EQ("Cannot make '" + target + "': File exists",
+              FailureOf([&] { MakeFile(target, "other", 0600); }));
+    EXPECT_EQ("new", Contents(target));
+}
+
 TEST_F(WholeFileTest, ANewFileHasNoListOfItsFolders) {
     if (!attributes::Set(folder.Path(), attributes::DefaultList, attributes::ListFor(54321))) {
         GTEST_SKIP() << "the temporary folder's file system has no access control lists";
