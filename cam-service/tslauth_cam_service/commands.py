@@ -77,6 +77,8 @@ def arguments(line):
     export = verb("export-audit", "Print what was done, an object of JSON a line")
     export.add_argument("--after", type=int, default=0, metavar="NUMBER",
                         help="what comes behind the entry of that number")
+    backup = verb("backup", "Copy the codes and the audit, while the service runs")
+    backup.add_argument("--output", metavar="FILE", required=True, help="it must not exist")
     verb("list-codes", "List the hosts that have an unused code")
     revoke = verb("revoke-code", "Make a host's code worthless")
     revoke.add_argument("--host", type=host_name, required=True)
@@ -188,13 +190,20 @@ def export_audit(store, options, _):
         after = rows[-1]["id"]
 
 
+def backup(store, options, _):
+    with options.output_file as file:
+        file.write(store.copy())
+        file.flush()
+        os.fsync(file.fileno())
+
+
 def revoke_code(store, options, who):
     if not store.revoke(options.host, who):
         raise Wrong(f"{options.host} has no code")
 
 
 ON_THE_STORE = {"issue-code": issue_code, "issue-codes": issue_codes, "list-codes": list_codes,
-                "revoke-code": revoke_code, "export-audit": export_audit}
+                "revoke-code": revoke_code, "export-audit": export_audit, "backup": backup}
 
 
 def run(options):
@@ -204,6 +213,8 @@ def run(options):
     os.umask(0o077)
     if options.verb == "issue-codes":
         options.lists = Lists(options)
+    elif options.verb == "backup":
+        options.output_file = open(options.output, "xb")  # where the operator may write
     become(prepare(configured.state))
     if options.verb == "serve":
         from .server import serve  # what it takes, the other verbs need not wait for

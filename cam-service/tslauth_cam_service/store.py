@@ -13,6 +13,8 @@ import hashlib
 import os
 import pathlib
 import secrets
+import sqlite3
+import tempfile
 import time
 
 import sqlalchemy as sa
@@ -116,6 +118,18 @@ class Store:
     def close(self):
         self._engine.dispose()
 
+    def copy(self):
+        """A SQLite database as it is at one moment, as the bytes of a file. BrokenState for any
+        other, which has tools of its own."""
+        if self._engine.dialect.name != "sqlite":
+            raise BrokenState("pg_dump copies a PostgreSQL database")
+        with tempfile.NamedTemporaryFile(dir=self._file.parent) as file:
+            with self._look() as connection:
+                copied = sqlite3.connect(file.name)
+                connection.connection.driver_connection.backup(copied)
+                copied.close()
+            return file.read()
+
     def is_ready(self):
         """Whether the database answers and its tables are of this version."""
         try:
@@ -211,7 +225,7 @@ class Store:
         with self._transaction() as connection:
             now = self._now(connection)
             found = connection.execute(schema.CODES.update().where(
-                schema.CODES.c.host == host.upper(), schema.CODES.c.state.in_(schema.OPEN)
+                schema.CODES.c.host == host.upper(), sa.text(schema.IS_OPEN)
             ).values(state=schema.REVOKED, changed_at=now)).rowcount
             self._note(connection, now, actor, "revoked", host.upper(), None,
                        "done" if found else "no code")
@@ -348,7 +362,7 @@ class Store:
     def _open_code(self, connection, attempt, is_locked):
         """The host's code, and the database's time."""
         code = sa.select(schema.CODES).where(
-            schema.CODES.c.host == attempt.host.upper(), schema.CODES.c.state.in_(schema.OPEN))
+            schema.CODES.c.host == attempt.host.upper(), sa.text(schema.IS_OPEN))
         row = connection.execute(code.with_for_update() if is_locked else code).first()
         return row, self._now(connection)
 
@@ -379,7 +393,7 @@ class Store:
     @staticmethod
     def _replace(connection, hosts, now):
         connection.execute(schema.CODES.update().where(
-            schema.CODES.c.host.in_(hosts), schema.CODES.c.state.in_(schema.OPEN)
+            schema.CODES.c.host.in_(hosts), sa.text(schema.IS_OPEN)
         ).values(state=schema.REPLACED, changed_at=now))
 
     @staticmethod

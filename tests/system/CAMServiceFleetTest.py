@@ -136,6 +136,20 @@ class FleetTest(unittest.TestCase):
         for host in hosts[::10]:
             self.assertEqual(403, self.at(NODES[2], host, issued[host], "another")[0])
 
+    def test_a_backup_is_restored(self):
+        before = self.fleet.issue(["backup1"])["backup1"]
+        dump = self.fleet.database.dump()
+        after = self.fleet.issue(["backup2"])["backup2"]
+        for number in range(3):
+            self.fleet.kill(number)
+        self.fleet.database.restore(dump)
+        for number in range(3):
+            self.fleet.start(number)
+        self.assertEqual(403, self.at(NODES[1], "backup2", after, "key")[0])
+        self.assertEqual(201, self.at(NODES[2], "backup1", before, "key")[0])
+        with self.assertRaises(Exception, msg="the audit may be changed"):
+            self.fleet.database.rows("UPDATE audit SET actor = 'nobody'")
+
     def test_a_service_whose_clock_is_off_takes_nothing_early_and_nothing_twice(self):
         for seconds in (7200, -7200):
             host = f"clock{'-' if seconds < 0 else ''}{abs(seconds)}"

@@ -181,6 +181,30 @@ class TrafficTest(unittest.TestCase):
              TREE / "cam-service/tslauth-cam-service.service"], capture_output=True, text=True)
         self.assertEqual(0, judged.returncode, judged.stdout[-300:] + judged.stderr)
 
+    def test_a_backup_is_restored(self):
+        before, after = self.fleet.issue(["backup1"])["backup1"], None
+        copy = pathlib.Path(self.folder.name, "copy")
+        self.fleet.run("backup", "--output", copy)
+        self.assertEqual(0o600, copy.stat().st_mode & 0o7777)
+        after = self.fleet.issue(["backup2"])["backup2"]
+        self.fleet.kill(0)
+        state = pathlib.Path(self.folder.name, "state0")
+        for path in state.glob("codes.db*"):
+            path.unlink()
+        copy.rename(state / "codes.db")
+        self.fleet.start(0)
+        try:
+            self.assertEqual(403, self.at("backup2", after))
+            self.assertEqual(201, self.at("backup1", before))
+        finally:
+            self.assertIn("BACKUP1", self.fleet.run("export-audit"))
+
+    def at(self, host, code):
+        async def asked():
+            async with self.fleet.session("127.5.1.1") as session:
+                return (await ask(session, SERVER, host, code, "key"))[0]
+        return asyncio.run(asked())
+
     def test_a_new_certificate_is_taken_without_a_restart(self):
         own = pathlib.Path("/etc/tessel/cam")
         process = self.fleet.processes[0]

@@ -66,6 +66,18 @@ class PostgreSQL:
     def stop(self):
         self._control("-m", "fast", "stop")
 
+    def dump(self):
+        return subprocess.run([f"{self._programs}/pg_dump", "-h", self.SOCKETS, "-U", "cam", "cam"],
+                              check=True, stdout=subprocess.PIPE).stdout
+
+    def restore(self, dump):
+        """Into a database that is empty; nobody may be connected."""
+        for name in ("dropdb", "createdb"):
+            self._run(name, "-h", self.SOCKETS, "-U", "cam", "cam")
+        subprocess.run([f"{self._programs}/psql", "-h", self.SOCKETS, "-U", "cam", "-q", "-v",
+                        "ON_ERROR_STOP=1", "cam"], check=True, input=dump,
+                       stdout=subprocess.DEVNULL)
+
     def rows(self, statement):
         return subprocess.run(
             [f"{self._programs}/psql", "-h", self.SOCKETS, "-U", "cam", "-At", "-c", statement],

@@ -326,6 +326,27 @@ class Tables(Folder):
             self.another().open()
         self.assertEqual(b"no database at all" * 100, file.read_bytes())
 
+    def test_no_step_looks_at_every_code(self):
+        steps = []
+        code = self.issue()
+        with contextlib.ExitStack() as stack:
+            def said(_, cursor, statement, parameters, *__):
+                steps.append((statement, parameters))
+            sa.event.listen(self.store._engine, "before_cursor_execute", said)
+            stack.callback(sa.event.remove, self.store._engine, "before_cursor_execute", said)
+            self.store.check(self.attempt(code), anything)
+            self.take(code)
+            self.issue()
+            self.store.revoke("host01", "alice")
+            self.store.page(7, 10, (schema.ISSUED,))
+            self.store.audit(7)
+        planned = [step for step in steps if step[0].startswith(("SELECT", "UPDATE"))]
+        self.assertGreater(len(planned), 8)
+        for statement, parameters in planned:
+            with self.store._engine.begin() as connection:
+                plan = connection.exec_driver_sql("EXPLAIN QUERY PLAN " + statement, parameters)
+                self.assertNotIn("SCAN", " ".join(row[3] for row in plan), statement)
+
     def test_the_audit_only_grows(self):
         self.now = 4000000000.0
         self.issue()
