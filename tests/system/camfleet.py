@@ -42,7 +42,7 @@ class PostgreSQL:
         self._programs = sorted(glob.glob("/usr/lib/postgresql/*/bin"))[-1]
         self._data = folder / "data"
         for path in (self.SOCKETS, self._data):
-            path.mkdir(parents=True, mode=0o700)
+            path.mkdir(parents=True, mode=0o700, exist_ok=True)
             os.chown(path, NOBODY, NOBODY)
         self._run("initdb", "-D", self._data, "-U", "cam", "-A", "trust", "--no-sync")
         self.start()
