@@ -1,5 +1,6 @@
 # SPDX-License-Identifier: Apache-2.0
 """What hosts and load balancers ask, as HTTP: openapi.json describes it."""
+import asyncio
 import json
 import pathlib
 
@@ -130,8 +131,8 @@ class Hosts:
     async def health(self, _):
         return web.json_response({"status": "alive"})
 
-    async def ready(self, request):
-        is_ready = not self.is_ending and await request.loop.run_in_executor(
+    async def ready(self, _):
+        is_ready = not self.is_ending and await asyncio.get_running_loop().run_in_executor(
             None, self._store.is_ready)
         return web.json_response({"status": "ready" if is_ready else "not ready"},
                                  status=200 if is_ready else 503)

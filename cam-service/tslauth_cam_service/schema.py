@@ -46,7 +46,7 @@ CODES = sa.Table(
     sa.Column("address", sa.String(64)),
     sa.Index("codes_open_host", "host", unique=True,
              sqlite_where=sa.text(IS_OPEN), postgresql_where=sa.text(IS_OPEN)),
-    sa.Index("codes_claim", "claim"),
+    sa.Index("codes_claim", "claim", unique=True),
     sa.Index("codes_state", "state", "id"),
     sa.Index("codes_state_changed", "state", "changed_at"),
 )

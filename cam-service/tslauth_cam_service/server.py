@@ -134,9 +134,10 @@ class Server:
                 ssl_handshake_timeout=REQUEST_SECONDS)
             stack.callback(listener.close)
 
-    async def metrics(self, request):
+    async def metrics(self, _):
         try:
-            counts = await request.loop.run_in_executor(self._threads, self._store.counts)
+            counts = await asyncio.get_running_loop().run_in_executor(
+                self._threads, self._store.counts)
         except (NoStore, BrokenState):
             counts = {}
         return web.Response(body=self._metrics.text(counts), content_type="text/plain")

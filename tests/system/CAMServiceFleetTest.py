@@ -157,7 +157,7 @@ class FleetTest(unittest.TestCase):
             self.fleet.kill(2)
             self.fleet.start(2, f"clock:{seconds}")
             self.fleet.database.rows(
-                f"UPDATE codes SET state = 'claimed', claim = 'other', claim_until = "
+                f"UPDATE codes SET state = 'claimed', claim = 'other-' || host, claim_until = "
                 f"extract(epoch FROM clock_timestamp()) + 30, found_until = "
                 f"extract(epoch FROM clock_timestamp()) + 900, host_key = 'x' "
                 f"WHERE host = '{host.upper()}'")

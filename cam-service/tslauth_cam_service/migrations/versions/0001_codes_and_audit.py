@@ -60,7 +60,7 @@ def upgrade():
         sa.Column("address", sa.String(64)))
     op.create_index("codes_open_host", "codes", ["host"], unique=True,
                     sqlite_where=sa.text(IS_OPEN), postgresql_where=sa.text(IS_OPEN))
-    op.create_index("codes_claim", "codes", ["claim"])
+    op.create_index("codes_claim", "codes", ["claim"], unique=True)
     op.create_index("codes_state", "codes", ["state", "id"])
     op.create_index("codes_state_changed", "codes", ["state", "changed_at"])
     op.create_table(
