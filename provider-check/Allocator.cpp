@@ -41,7 +41,7 @@ std::atomic<std::size_t> kept{0};
 std::atomic<Header*> allReleased{nullptr};
 
 Header* HeaderOf(void const* memory) {
-    return reinterpret_cast<Header*>(reinterpret_cast<std::uintptr_t>(memory) - sizeof(Header));
+    return static_cast<Header*>(const_cast<void*>(memory)) - 1;
 }
 
 std::uintptr_t MarkOf(std::uintptr_t mark, void const* memory) {

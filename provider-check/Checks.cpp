@@ -206,6 +206,7 @@ void CheckEntry(Children const& children, Subject const& subject, std::size_t in
                 std::vector<Arguments> const& arguments) {
     typedef std::function<void(Session&, Entry const&)> Step;
     std::vector<Step> steps;
+    steps.reserve(arguments.size() + 5);
     for (Arguments const& combination : arguments) {
         steps.emplace_back([&combination](Session& session, Entry const& entry) {
             session.CallAndRelease(entry, combination);

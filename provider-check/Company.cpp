@@ -104,6 +104,7 @@ void LookAtThreads(Session& session) {
     constexpr unsigned rounds = 25;
     auto const entries = session.Callable(true);
     std::vector<std::unique_ptr<UsualTexts>> texts;
+    texts.reserve(entries.size());
     for (Entry const* const entry : entries) {
         texts.push_back(std::make_unique<UsualTexts>(*entry));
     }

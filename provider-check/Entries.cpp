@@ -57,6 +57,7 @@ template <typename Call> Answer TextFrom(Call call) {
 /// is as far as it can go.
 template <typename Element> std::size_t Count(Element* const* array, Answer& answer) {
     std::size_t const bytes = Allocator::SizeOf(array);
+    // NOLINTNEXTLINE(bugprone-sizeof-expression): the elements are pointers
     std::size_t const most = bytes == 0 ? mostElements : bytes / sizeof *array;
     std::size_t count = 0;
     while (count < most && array[count] != nullptr) {

@@ -34,6 +34,7 @@ void Recorder::Found(Rule rule, char const* format, ...) {
     finding.rule = rule;
     va_list arguments;
     va_start(arguments, format);
+    // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): it is not
     (void)std::vsnprintf(finding.text.data(), finding.text.size(), format, arguments);
     va_end(arguments);
     finding.whole = true;
@@ -42,6 +43,7 @@ void Recorder::Found(Rule rule, char const* format, ...) {
 void Recorder::Begin(char const* format, ...) {
     va_list arguments;
     va_start(arguments, format);
+    // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): it is not
     (void)std::vsnprintf(_doing.data(), _doing.size(), format, arguments);
     va_end(arguments);
     ++_calls;

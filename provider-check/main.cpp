@@ -7,6 +7,7 @@
 
 #include <CLI/CLI.hpp>
 
+#include <cstdio>
 #include <fstream>
 #include <iostream>
 
@@ -40,9 +41,7 @@ int Run(std::string const& provider, std::string const& profile, std::string con
     return report.Passes() ? Passes : Findings;
 }
 
-} // namespace
-
-int main(int argc, char** argv) {
+int Main(int argc, char** argv) {
     CLI::App application("Whether a provider keeps to the rules of its interface",
                          "tslauth-provider-check");
     std::string provider;
@@ -51,11 +50,21 @@ int main(int argc, char** argv) {
     application.add_option("PROVIDER", provider, "its name, or its file")->required();
     application.add_option("--profile", profile, "what its author says of it");
     application.add_option("--junit", junit, "a file to write the results to, as JUnit's XML");
-    CLI11_PARSE(application, argc, argv);
     try {
-        return Run(provider, profile, junit);
+        application.parse(argc, argv);
+    } catch (CLI::ParseError const& error) {
+        return application.exit(error) == 0 ? Passes : Unusable;
+    }
+    return Run(provider, profile, junit);
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    try {
+        return Main(argc, argv);
     } catch (std::exception const& exception) {
-        std::cerr << "tslauth-provider-check: " << exception.what() << '\n';
+        (void)std::fprintf(stderr, "tslauth-provider-check: %s\n", exception.what());
         return Unusable;
     }
 }

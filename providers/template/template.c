@@ -52,15 +52,16 @@ static int GetTrustedDomains(ActiveDirectoryClientDomain*** domains,
 /* How a text is handed out. */
 static int ConvertCanonicalUsername(char const* name, char** canonicalName,
                                     ActiveDirectoryClientFreeFunction* release) {
+    size_t const size = strlen(name) + 1;
     char* text;
     if (*name == '\0') {
         return TSLAUTH_PROVIDER_NO_SUCH_USER;
     }
-    text = malloc(strlen(name) + 1);
+    text = malloc(size);
     if (text == NULL) {
         return TSLAUTH_PROVIDER_NOT_ENOUGH_MEMORY;
     }
-    strcpy(text, name); /* your directory's form of the name */
+    memcpy(text, name, size); /* your directory's form of the name */
     *canonicalName = text;
     *release = free;
     return TSLAUTH_PROVIDER_SUCCESS;
