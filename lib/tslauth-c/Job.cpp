@@ -2,10 +2,10 @@
 #include "Directory.h"
 
 #include <base/Descriptor.h>
+#include <base/SignalsBlocked.h>
 
 #include <cerrno>
 #include <condition_variable>
-#include <csignal>
 #include <cstring>
 #include <functional>
 #include <sys/eventfd.h>
@@ -50,24 +50,6 @@ void Run(std::shared_ptr<Shared> const& shared, Work& work) {
     End(*shared, std::move(answer), failure);
 }
 
-/// Keeps every signal off threads that are made meanwhile: they are for the caller's own.
-class SignalsBlocked {
-public:
-    SignalsBlocked() {
-        sigset_t all;
-        (void)sigfillset(&all);
-        (void)pthread_sigmask(SIG_SETMASK, &all, &_before);
-    }
-    SignalsBlocked(SignalsBlocked const&) = delete;
-    SignalsBlocked& operator=(SignalsBlocked const&) = delete;
-    ~SignalsBlocked() {
-        (void)pthread_sigmask(SIG_SETMASK, &_before, nullptr);
-    }
-
-private:
-    sigset_t _before{};
-};
-
 std::shared_ptr<Shared> Start(Work work) {
     auto shared = std::make_shared<Shared>();
     shared->descriptor = base::Descriptor(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
@@ -75,7 +57,7 @@ std::shared_ptr<Shared> Start(Work work) {
         throw Failure(TSLAUTH_ERROR_SYSTEM,
                       std::string("cannot make a descriptor: ") + std::strerror(errno));
     }
-    SignalsBlocked const signals;
+    base::SignalsBlocked const signals;
     std::thread([shared, work = std::move(work)]() mutable { Run(shared, work); }).detach();
     return shared;
 }

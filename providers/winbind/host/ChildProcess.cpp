@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <base/Descriptor.h>
+#include <base/SignalsBlocked.h>
 #include <cerrno>
 #include <csignal>
 #include <fcntl.h>
@@ -49,24 +50,6 @@ struct Pipe {
     }
     base::Descriptor reading;
     base::Descriptor writing;
-};
-
-/// All signals, so that no handler of the host's runs in a child that shares its memory's contents.
-class AllSignalsBlocked {
-public:
-    AllSignalsBlocked() {
-        sigset_t all;
-        (void)::sigfillset(&all); // neither can fail for a set and a `how` that exist
-        (void)::pthread_sigmask(SIG_SETMASK, &all, &_old);
-    }
-    AllSignalsBlocked(AllSignalsBlocked const&) = delete;
-    AllSignalsBlocked& operator=(AllSignalsBlocked const&) = delete;
-    ~AllSignalsBlocked() {
-        (void)::pthread_sigmask(SIG_SETMASK, &_old, nullptr);
-    }
-
-private:
-    sigset_t _old = {};
 };
 
 /// What both processes need, put together before the first of them is made: afterwards no memory
@@ -328,7 +311,7 @@ ChildProcess::Outcome ChildProcess::Run(Task const& task, Clock::time_point dead
     long made = -1;
     int error = 0;
     {
-        AllSignalsBlocked const blocked;
+        base::SignalsBlocked const blocked;
         // No exit signal: the host gets no SIGCHLD, and its waiting for any child finds none. As
         // this process executes nothing, it stays that way until it is waited for below.
         made = ::syscall(SYS_clone, 0UL, nullptr, nullptr, nullptr, nullptr);

@@ -6,8 +6,8 @@
 #include <tslauth/Exception.h>
 #include <tslauth/TslauthThreadUtil.h>
 
+#include <base/SignalsBlocked.h>
 #include <condition_variable>
-#include <csignal>
 #include <exception>
 #include <mutex>
 #include <new>
@@ -84,25 +84,6 @@ void RunCall(std::shared_ptr<Call> call) {
     threads.changed.notify_all();
 }
 
-/// Keeps every signal off the threads that are made meanwhile: the host's handlers belong to the
-/// host's threads, and libwbclient takes an interrupted wait for a winbindd that is gone.
-class SignalsBlocked {
-public:
-    SignalsBlocked() {
-        sigset_t all;
-        (void)sigfillset(&all); // these three cannot fail with valid arguments
-        (void)pthread_sigmask(SIG_SETMASK, &all, &_before);
-    }
-    SignalsBlocked(SignalsBlocked const&) = delete;
-    SignalsBlocked& operator=(SignalsBlocked const&) = delete;
-    ~SignalsBlocked() {
-        (void)pthread_sigmask(SIG_SETMASK, &_before, nullptr);
-    }
-
-private:
-    sigset_t _before;
-};
-
 Failure TimedOut(std::string const& what) {
     return {TSLAUTH_PROVIDER_TIMED_OUT, what + ": no answer in time"};
 }
@@ -132,7 +113,8 @@ void BoundedCall::Wait(std::string const& what, Clock::time_point deadline,
     ++threads.running;
     lock.unlock();
     try {
-        SignalsBlocked const blocked;
+        // Also for libwbclient, which takes an interrupted wait for a winbindd that is gone.
+        base::SignalsBlocked const blocked;
         authentication::TslauthThreadUtil::ScheduleThread([call] { RunCall(call); });
     } catch (std::exception const& e) {
         lock.lock();
