@@ -10,10 +10,11 @@ authentication::AuthenticationStoreFactory& Factory() {
     using authentication::AuthenticationStoreFactory;
     static std::mutex lock;
     std::lock_guard<std::mutex> const guard(lock);
-    if (AuthenticationStoreFactory::Instance() == nullptr) {
-        (void)std::make_unique<AuthenticationStoreFactory>().release(); // it registers itself
+    if (AuthenticationStoreFactory* const found = AuthenticationStoreFactory::Instance()) {
+        return *found;
     }
-    return *AuthenticationStoreFactory::Instance();
+    // It registers itself, and is never destroyed: a job may still run when the process ends.
+    return *std::make_unique<AuthenticationStoreFactory>().release();
 }
 
 } // namespace tessel::tslauth_c

@@ -147,12 +147,19 @@ TEST_P(BrokenProvidersTest, FailsForItsReason) {
     }
     CheckedProvider const checked = Checked(BROKEN_PROVIDERS, GetParam().provider, text);
     EXPECT_EQ(1, checked.exitCode);
+    if (SANITIZED != 0) {
+        return; // it may come first, and says in its own words what is wrong
+    }
     EXPECT_EQ(GetParam().broken, Without(GetParam().sometimes, checked.broken)) << checked.tap;
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, BrokenProvidersTest, testing::ValuesIn(Broken()), NameOf);
 
 TEST_P(LoadedProvidersTest, KeepsToTheRulesItKeepsTo) {
+    if (SANITIZED != 0) {
+        GTEST_SKIP()
+            << "a sanitizer's own words at the end of a child are taken for the provider's";
+    }
     CheckedProvider const checked = Checked(TEST_PROVIDERS, GetParam().provider);
     EXPECT_EQ(GetParam().broken.empty() ? 0 : 1, checked.exitCode);
     EXPECT_EQ(GetParam().broken, Without(GetParam().sometimes, checked.broken)) << checked.tap;
