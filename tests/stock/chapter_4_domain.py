@@ -107,7 +107,7 @@ def closed_accounts(lab, host):
 
 def changes_at_log_in(host, user, old, new):
     """login(1) demands a new password."""
-    terminal = host.terminal("login", user)
+    terminal = host.console(user)
     for asked, answer in ((r"assword: ?$", old), (r"(?i)new.*password: ?$", new),
                           (r"(?i)(again|retype|repeat|new).*: ?$", new)):
         found = terminal.expect([asked, r"(?i)incorrect", r"(?i)current.*: ?$"])

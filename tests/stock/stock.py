@@ -113,6 +113,10 @@ class StockHost(Node):
                              env={**ENVIRONMENT, "TERM": "dumb"}, encoding="utf-8",
                              codec_errors="replace", timeout=timeout)
 
+    def console(self, user):
+        """login(1) on a terminal that it has for itself: Debian 13's asks on no other."""
+        return self.terminal("setsid", "--ctty", "--wait", "login", user)
+
     def _asks(self, terminal, answers, wanted):
         """Answers what is asked for; whether the wanted text came before the end."""
         seen = ""
@@ -132,7 +136,7 @@ class StockHost(Node):
 
     def logs_in(self, user, password):
         """Whether login(1) lets somebody in on a terminal, and what it said."""
-        terminal = self.terminal("login", user)
+        terminal = self.console(user)
         found = terminal.expect([r"(?i)password: ?$", pexpect.EOF, pexpect.TIMEOUT])
         if found != 0:
             terminal.close(force=True)
