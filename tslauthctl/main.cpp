@@ -40,6 +40,7 @@ constexpr char footer[] = R"(Exit codes:
   10 not joined
   11 joined to another domain (join)
   12 the domain does not tell, or the trust in it is not in order (status)
+  13 tried first, it would lock out root or who may become root; nothing was changed
   A signal such as ^C ends the tool as such; a shell shows 128 and its number, 130 for ^C.
 )";
 
@@ -54,6 +55,7 @@ struct Arguments {
     bool write = false;
     bool deep = false;
     std::string provider;
+    int confirmWithin = 0;
     AccessArguments access;
     UndoArguments undo;
     bool list = false;
@@ -96,13 +98,16 @@ public:
 
         auto* activate =
             Add("activate", "Make a store the active one", arguments, [&](Console& console) {
-                return RunActivate(arguments.store, arguments.acceptLoss, console);
+                return RunActivate(arguments.store, arguments.acceptLoss, arguments.confirmWithin,
+                                   console);
             });
         activate->add_option("store", arguments.store, "Display name of a store")
             ->required()
             ->type_name("NAME");
         activate->add_flag("--accept-loss", arguments.acceptLoss,
                            "Also where the files lose what the library cannot carry");
+
+        AddConfirmWithin(*activate, arguments.confirmWithin);
 
         auto* prepare =
             Add("prepare", "Show the smallest edit that lets the library carry the files",
@@ -214,8 +219,10 @@ private:
     }
 
     void AddSetup(CLI::App& plan, Arguments& arguments) {
-        auto* setup = Add("setup", "Make the host ready for a provider", arguments,
-                          [&](Console& console) { return RunSetup(arguments.provider, console); });
+        auto* setup =
+            Add("setup", "Make the host ready for a provider", arguments, [&](Console& console) {
+                return RunSetup(arguments.provider, arguments.confirmWithin, console);
+            });
         auto* preview =
             Add(plan, "setup", "Show what 'setup' would write", arguments,
                 [&](Console& console) { return RunPlanSetup(arguments.provider, console); });
@@ -225,6 +232,7 @@ private:
                 ->check(NotEmpty)
                 ->type_name("NAME");
         }
+        AddConfirmWithin(*setup, arguments.confirmWithin);
         Add("unsetup", "Make the host what it was before 'setup'", arguments, RunUnsetup);
         Add(plan, "unsetup", "Show what 'unsetup' would write", arguments, RunPlanUnsetup);
     }
@@ -247,6 +255,9 @@ private:
                 ->check(NotEmpty)
                 ->type_name("NAME");
             command->add_flag("--force", arguments.access.force, "Also names that are not known");
+            if (writes) {
+                AddConfirmWithin(*command, arguments.access.confirmWithin);
+            }
             return command;
         };
         for (bool const writes : {true, false}) {
@@ -263,7 +274,16 @@ private:
         }
     }
 
+    static void AddConfirmWithin(CLI::App& command, int& seconds) {
+        command
+            .add_option("--confirm-within", seconds,
+                        "Undo it after so many seconds, unless 'tslauthctl confirm' was run")
+            ->check(CLI::Range(1, 86400).description(""))
+            ->type_name("SECONDS");
+    }
+
     void AddHistory(Arguments& arguments) {
+        Add("confirm", "Keep a change that is undone by itself otherwise", arguments, RunConfirm);
         auto const addNumber = [&](CLI::App& command) {
             return command.add_option("number", arguments.undo.number, "The change's number")
                 ->check(CLI::Range(1U, std::numeric_limits<unsigned>::max()).description(""))
@@ -285,6 +305,8 @@ private:
         undo->add_flag("--dry-run", arguments.undo.dryRun, "Show it, and change nothing");
         undo->add_flag("--force", arguments.undo.force,
                        "Also where others have edited the files since");
+        undo->add_flag("--unconfirmed", arguments.undo.unconfirmed,
+                       "The change that nobody has confirmed in time, if there is one");
     }
 
     void AddMembership(Arguments& arguments) {

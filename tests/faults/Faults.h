@@ -98,6 +98,11 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
         {__NR_fchmod, "chmod"},
         {__NR_fchmodat, "chmod"},
         {__NR_fchown, "chown"},
+        {__NR_fchownat, "chown"},
+#ifdef __NR_chown
+        {__NR_chown, "chown"},
+        {__NR_lchown, "chown"},
+#endif
 #ifdef __NR_fchown32
         {__NR_fchown32, "chown"},
 #endif
@@ -120,6 +125,10 @@ inline std::vector<std::pair<int, char const*>> const& Calls() {
         {__NR_link, "link"},
 #endif
         {__NR_linkat, "link"},
+#ifdef __NR_symlink
+        {__NR_symlink, "symlink"},
+#endif
+        {__NR_symlinkat, "symlink"},
 #ifdef __NR_mkdir
         {__NR_mkdir, "mkdir"},
 #endif

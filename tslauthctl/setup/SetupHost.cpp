@@ -135,7 +135,8 @@ std::optional<std::string> ReadUntilClosed(base::Descriptor const& descriptor,
 
 constexpr std::chrono::seconds patience(60);
 
-/// Runs a program of the system without input, and gives what it writes to where errors go.
+} // namespace
+
 std::string RunProgram(std::vector<std::string> arguments) {
     auto const fail = [&](std::string const& reason) {
         throw Failure(ExitCode::failure, "'" + arguments.front() + "' " + reason);
@@ -184,8 +185,6 @@ std::string RunProgram(std::vector<std::string> arguments) {
     }
     return *said;
 }
-
-} // namespace
 
 SetupFacts ReadSetupFacts(std::string const& provider) {
     RequireProvider(provider);
@@ -252,7 +251,9 @@ void MakeFolder(std::string const& path) {
 }
 
 void RemoveEmptyFolder(std::string const& path) {
-    (void)rmdir(path.c_str()); // somebody else may have put something there
+    if (rmdir(path.c_str()) != 0 && errno != ENOTEMPTY && errno != EEXIST && errno != ENOENT) {
+        Fail("remove", path, errno);
+    }
     base::SyncFolderOf(path);
 }
 

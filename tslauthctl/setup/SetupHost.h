@@ -38,10 +38,16 @@ std::vector<std::string> MissingFolders(std::string const& path);
 void MakeFolder(std::string const& path);
 
 /// Leaves a folder that is not empty.
+/// @throws Failure where an empty one stays
 void RemoveEmptyFolder(std::string const& path);
 
 /// @throws Failure
 void MakeLink(std::string const& path, std::string const& target);
+
+/// Runs a program of the system without input, a minute at most, and gives what it writes to where
+/// errors go.
+/// @throws Failure where it fails or does not end
+std::string RunProgram(std::vector<std::string> arguments);
 
 /// Runs pam-auth-update, which asks nothing and writes the policies that Debian's services include.
 /// Blocks for as long as it takes, a minute at most.

@@ -21,7 +21,9 @@ inline constexpr char AccessRules[] = "/etc/tessel/tslauth/access.conf";
 inline constexpr char const* ServicePolicies[] = {
     "/etc/pam.d/common-auth", "/etc/pam.d/common-account", "/etc/pam.d/common-password",
     "/etc/pam.d/common-session", "/etc/pam.d/common-session-noninteractive"};
-/// The beginning of their names, by which a policy includes them.
+/// Where a service's policy is, under its name.
+inline constexpr char ServiceFolder[] = "/etc/pam.d/";
+/// The beginning of the names of those, by which a policy includes them.
 inline constexpr char ServicePolicyPrefix[] = "common-";
 
 /// The profiles by which they lead to the policy, and where pam-auth-update finds those.

@@ -95,6 +95,8 @@ char const* Word(ExitCode code) {
         return "joined-elsewhere";
     case ExitCode::untrusted:
         return "untrusted";
+    case ExitCode::locksOut:
+        return "locks-out";
     }
     return "failure";
 }

@@ -24,7 +24,8 @@ enum class ExitCode {
     credentials = 9,
     notJoined = 10,
     joinedElsewhere = 11,
-    untrusted = 12
+    untrusted = 12,
+    locksOut = 13
 };
 
 /// The word for an exit code, as it stands in the JSON document.

@@ -1,13 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "analysis/Agreement.h"
 #include "analysis/Failures.h"
 #include "analysis/HostFile.h"
 #include "analysis/HostPlan.h"
 #include "analysis/KnownStores.h"
 #include "history/HistoryPaths.h"
+#include "trial/LogInTrial.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/Exceptions.h>
+#include <tslauth/Paths.h>
 
 #include <base/AsciiText.h>
 
@@ -28,6 +31,56 @@ std::vector<std::string> ChangedFiles(HostPlan const& plan) {
     return changed;
 }
 
+PlannedTexts TextsAfter(authentication::ActivationPreview const& preview) {
+    PlannedTexts texts;
+    for (auto const& file : preview.files) {
+        texts[file.path] = file.after;
+    }
+    return texts;
+}
+
+/// The files in which the entries that the plan is about are not as the store wants them, by the
+/// same measure as `status`.
+std::vector<std::string> FilesNotInStep(HostPlan const& plan) {
+    bool const wanted = plan.store == ActiveDirectory;
+    auto const& known = wanted ? plan.insertedAfterwards : plan.insertedMeanwhile;
+    bool policy = true;
+    bool services = true;
+    auto const agrees = [](std::vector<Part> const& parts) {
+        return Together(parts) == Agreement::inStep || Together(parts) == Agreement::unknown;
+    };
+    for (auto const& entries : known) {
+        policy = policy && agrees(PAMParts(ReadHostFile(authentication::Paths::PAMPolicy),
+                                           entries.pam, wanted));
+        services =
+            services && agrees(NSSParts(ReadHostFile(authentication::Paths::NSSConfiguration),
+                                        entries.nss, wanted));
+    }
+    std::vector<std::string> files;
+    if (!policy) {
+        files.emplace_back(authentication::Paths::PAMPolicy);
+    }
+    if (!services) {
+        files.emplace_back(authentication::Paths::NSSConfiguration);
+    }
+    return files;
+}
+
+/// No change ends well that has left the host out of step.
+ExitCode Verified(HostPlan const& plan, ExitCode code, Console& console) {
+    auto const files = FilesNotInStep(plan);
+    if (files.empty()) {
+        return code;
+    }
+    console.Error(Failure(ExitCode::drift, "'" + plan.store +
+                                               "' is recorded, and the host does not do as it "
+                                               "says; see 'tslauthctl status'"));
+    for (auto const& path : files) {
+        console.ErrorDetail("not in step: " + path);
+    }
+    return ExitCode::drift;
+}
+
 /// Forgets what has been taken out. That the record names too much harms nothing.
 ExitCode FinishRecord(HostPlan const& plan, Console& console) {
     try {
@@ -41,10 +94,12 @@ ExitCode FinishRecord(HostPlan const& plan, Console& console) {
 
 } // namespace
 
-ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console) {
+ExitCode RunActivate(std::string const& store, bool acceptLoss, int confirmWithin,
+                     Console& console) {
     RequireStore(store);
     RequireRoot("activate");
     HostChange change(console);
+    change.ConfirmWithin(confirmWithin);
     auto const plan = MakeHostPlan(store);
     auto& document = console.Document();
     document["changed"] = nlohmann::json::array();
@@ -86,6 +141,9 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
         }
         console.ErrorDetail("see 'tslauthctl prepare', or give --accept-loss");
         return ExitCode::loss;
+    }
+    if (plan.preview.Changes()) {
+        LogInTrial().Require(TextsAfter(plan.preview), console);
     }
     auto code = ExitCode::done;
     try {
@@ -135,7 +193,7 @@ ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console
                  (changed.empty() ? "nothing had to be changed"
                                   : base::AsciiText::Counted(changed.size(), "file") + " changed") +
                  ".");
-    return code;
+    return Verified(plan, code, console);
 }
 
 } // namespace tessel::tslauthctl

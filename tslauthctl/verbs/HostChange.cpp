@@ -2,6 +2,7 @@
 #include "verbs/HostChange.h"
 
 #include "analysis/ChangeLog.h"
+#include "history/Confirmation.h"
 #include "history/HistoryArchive.h"
 #include "history/PathOnHost.h"
 #include "history/UndoPlan.h"
@@ -59,28 +60,60 @@ HostChange::HostChange(Console& console) try : _console(console) {
 
 void HostChange::Write(std::string const& verb, std::vector<std::string> const& paths,
                        std::function<void()> const& write) {
+    RequireNothingOpen(verb);
     HoldSignals();
     auto const snapshot = Kept(verb, paths);
     try {
+        if (_confirmWithin > 0) {
+            AwaitConfirmation(snapshot.number, _confirmWithin);
+        }
         write();
     } catch (...) {
         PutBack(snapshot);
-        Conclude(snapshot);
+        (void)Conclude(snapshot);
+        if (_confirmWithin > 0) {
+            ForgetConfirmation();
+        }
         throw;
     }
-    Conclude(snapshot);
+    bool const changed = Conclude(snapshot);
+    if (_confirmWithin > 0 && changed) {
+        TellConfirmation(snapshot);
+    } else if (_confirmWithin > 0) {
+        ForgetConfirmation();
+    }
+}
+
+void HostChange::RequireNothingOpen(std::string const& verb) const {
+    auto const open = OpenConfirmation();
+    if (open && verb != "undo") {
+        throw Failure(ExitCode::refused,
+                      "Change " + std::to_string(open->number) +
+                          " waits to be confirmed, and is "
+                          "undone in " +
+                          std::to_string(SecondsLeft(*open)) +
+                          " seconds: "
+                          "'tslauthctl confirm' keeps it, 'tslauthctl undo' takes it back");
+    }
+}
+
+void HostChange::TellConfirmation(Snapshot const& snapshot) {
+    _console.Document()["confirm"] = {{"number", snapshot.number}, {"seconds", _confirmWithin}};
+    _console.Warning("This is undone in " + std::to_string(_confirmWithin) +
+                     " seconds. Log in anew, and type there: tslauthctl confirm");
 }
 
 void HostChange::Follow(std::string const& verb, std::vector<std::string> const& paths,
                         std::function<void()> const& change) {
+    RequireNothingOpen(verb);
     auto const snapshot = Kept(verb, paths);
     try {
         change();
     } catch (...) {
-        Conclude(snapshot);
+        (void)Conclude(snapshot);
         throw;
     }
-    Conclude(snapshot);
+    (void)Conclude(snapshot);
 }
 
 void HostChange::PutBack(Snapshot const& snapshot) {
@@ -105,18 +138,19 @@ void HostChange::PutBack(Snapshot const& snapshot) {
     }
 }
 
-void HostChange::Conclude(Snapshot snapshot) {
+bool HostChange::Conclude(Snapshot snapshot) {
     try {
         snapshot.after = CurrentOf(snapshot.before);
         if (snapshot.Changed().empty()) {
             DropSnapshot(snapshot);
-        } else {
-            FinishSnapshot(snapshot);
+            return false;
         }
+        FinishSnapshot(snapshot);
     } catch (std::exception const& e) {
         // The change stands, and what the host was before is kept.
         _console.Warning(e.what());
     }
+    return true;
 }
 
 void RequireRoot(char const* what) {

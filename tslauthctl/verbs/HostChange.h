@@ -21,6 +21,12 @@ public:
     /// @throws Failure
     explicit HostChange(Console& console);
 
+    /// Has the next change undone in so many seconds, unless somebody confirms it.
+    /// @param seconds 0 for never
+    void ConfirmWithin(int seconds) noexcept {
+        _confirmWithin = seconds;
+    }
+
     /// Keeps what there is at `paths`, and then has `write` change it. Where that fails, all of it
     /// becomes what it was, and what does not is told. Signals that end the process wait until it
     /// has said how it ended. A change that has changed nothing is forgotten.
@@ -37,8 +43,13 @@ public:
 
 private:
     void PutBack(Snapshot const& snapshot);
-    void Conclude(Snapshot snapshot);
+    /// @return whether anything has changed
+    bool Conclude(Snapshot snapshot);
 
+    void RequireNothingOpen(std::string const& verb) const;
+    void TellConfirmation(Snapshot const& snapshot);
+
+    int _confirmWithin = 0;
     Console& _console;
     authentication::HostLock _lock;
 };

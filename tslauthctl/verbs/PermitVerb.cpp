@@ -8,6 +8,7 @@
 #include "setup/SetupHost.h"
 #include "setup/SetupPaths.h"
 #include "terminal/UnifiedDiff.h"
+#include "trial/LogInTrial.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
@@ -168,12 +169,14 @@ ExitCode RunAccess(AccessArguments const& arguments, Limit limit, Console& conso
     // Not while everybody else has to wait for the answers.
     auto const subjects = SubjectsOf(arguments, limit, console);
     HostChange change(console);
+    change.ConfirmWithin(arguments.confirmWithin);
     auto const before = ReadRules();
     auto const after = Preview(before, arguments, subjects, console);
     if (before == after) {
         console.Line("Nothing had to be changed.");
         return ExitCode::done;
     }
+    LogInTrial().Require({{Paths::AccessRules, after}}, console);
     change.Write(verb, PathsOfAccess(), [&] {
         PutOnHost(Paths::AccessRules, after);
         RecordChange(Paths::AccessRules, after);

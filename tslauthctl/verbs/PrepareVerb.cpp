@@ -2,6 +2,7 @@
 #include "analysis/HostFile.h"
 #include "analysis/Prepare.h"
 #include "terminal/UnifiedDiff.h"
+#include "trial/LogInTrial.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
@@ -22,8 +23,8 @@ namespace {
 
 using namespace authentication;
 
-/// A name for the original beside the file: FILE.tslauth-orig, or with a number behind it where that
-/// is taken.
+/// A name for the original beside the file: FILE.tslauth-orig, or with a number behind it where
+/// that is taken.
 std::string NameForOriginal(std::string const& path) {
     auto const first = path + ".tslauth-orig";
     auto name = first;
@@ -77,15 +78,18 @@ struct PreparedFile {
 };
 
 /// Replaces the files that change, which stay what they were in all but their texts.
-void Write(std::vector<PreparedFile>& files, HostChange& change) {
+void Write(std::vector<PreparedFile>& files, HostChange& change, Console& console) {
     std::vector<std::string> paths;
+    PlannedTexts texts;
     for (auto& file : files) {
         if (file.Changes()) {
             file.original = NameForOriginal(file.path);
             paths.push_back(file.path);
             paths.push_back(file.original);
+            texts[file.path] = file.prepared.text;
         }
     }
+    LogInTrial().Require(texts, console);
     change.Write("prepare", paths, [&] {
         for (auto const& file : files) {
             if (file.Changes()) {
@@ -150,7 +154,7 @@ ExitCode Prepare(HostChange* change, bool acceptLoss, Console& console) {
     document["written"] = false;
     document["files"] = nlohmann::json::array();
     if (change != nullptr && changes && !refused) {
-        Write(files, *change);
+        Write(files, *change, console);
     }
     document["written"] = change != nullptr && !refused;
     for (auto const& file : files) {

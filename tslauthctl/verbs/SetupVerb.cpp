@@ -6,6 +6,7 @@
 #include "setup/SetupHost.h"
 #include "setup/SetupPaths.h"
 #include "terminal/UnifiedDiff.h"
+#include "trial/LogInTrial.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
@@ -140,6 +141,14 @@ void CarryOut(SetupPlan const& plan, SetupFacts const& facts) {
     if (!plan.profilesOn.empty()) {
         LeadServicesToPolicy(plan, record);
     }
+}
+
+PlannedTexts TextsAfter(SetupPlan const& plan) {
+    PlannedTexts texts;
+    for (auto const& file : plan.files) {
+        texts[file.path] = file.after;
+    }
+    return texts;
 }
 
 /// Who may log in once a store is active, in one line.
@@ -295,7 +304,7 @@ ExitCode Conclude(std::vector<FileUndo> const& files, Console& console) {
 }
 
 /// Makes the host what it was.
-ExitCode TakeBack(SetupRecord const& record, Console& console) {
+ExitCode TakeBack(SetupRecord const& record, LogInTrial const& trial, Console& console) {
     auto undoing = PlanUndoing(record);
     // First of all, so that no service ever includes a policy that is gone.
     TakeServicesBack(record, undoing);
@@ -309,6 +318,7 @@ ExitCode TakeBack(SetupRecord const& record, Console& console) {
     for (auto folder = record.folders.rbegin(); folder != record.folders.rend(); ++folder) {
         RemoveEmptyFolder(*folder);
     }
+    trial.RequireNow();
     Describe(undoing.files, console);
     return Conclude(undoing.files, console);
 }
@@ -339,14 +349,20 @@ ExitCode RunPlanSetup(std::string const& provider, Console& console) {
     return ExitCode::changes;
 }
 
-ExitCode RunSetup(std::string const& provider, Console& console) {
+ExitCode RunSetup(std::string const& provider, int confirmWithin, Console& console) {
     RequireRoot("setup");
     HostChange change(console);
+    change.ConfirmWithin(confirmWithin);
     auto const facts = ReadSetupFacts(provider);
     auto const plan = MakeSetupPlan(facts);
     Describe(plan, provider, console);
     if (plan.Changes()) {
-        change.Write("setup", PathsOfSetup(), [&] { CarryOut(plan, facts); });
+        LogInTrial const trial;
+        trial.Require(TextsAfter(plan), console);
+        change.Write("setup", PathsOfSetup(), [&] {
+            CarryOut(plan, facts);
+            trial.RequireNow(); // what pam-auth-update writes is known by now
+        });
     }
     for (auto const& file : plan.files) {
         if (file.Changes()) {
@@ -384,7 +400,7 @@ ExitCode RunPlanUnsetup(Console& console) {
 ExitCode RunUnsetup(Console& console) {
     RequireRoot("unsetup");
     if (!IsNoneActive()) {
-        auto const left = RunActivate(NoStore, false, console);
+        auto const left = RunActivate(NoStore, false, 0, console);
         if (left != ExitCode::done) {
             // A loss of this command's own is that something has stayed.
             return left == ExitCode::loss ? ExitCode::refused : left;
@@ -401,7 +417,8 @@ ExitCode RunUnsetup(Console& console) {
         return ExitCode::done;
     }
     auto code = ExitCode::done;
-    change.Write("unsetup", PathsOfSetup(), [&] { code = TakeBack(*record, console); });
+    LogInTrial const trial;
+    change.Write("unsetup", PathsOfSetup(), [&] { code = TakeBack(*record, trial, console); });
     return code;
 }
 

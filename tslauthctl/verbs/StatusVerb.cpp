@@ -8,6 +8,7 @@
 #include "analysis/Policies.h"
 #include "analysis/ProviderCheck.h"
 #include "analysis/ProviderOnHost.h"
+#include "history/Confirmation.h"
 #include "verbs/Verbs.h"
 
 #include <tslauth/ActiveDirectoryStore.h>
@@ -109,6 +110,21 @@ void Describe(std::vector<Finding> const& findings, Console& console) {
     }
 }
 
+/// The change that waits to be confirmed.
+void DescribeConfirmation(Console& console) {
+    if (geteuid() != 0) {
+        return;
+    }
+    auto const open = OpenConfirmation();
+    if (!open) {
+        return;
+    }
+    auto const left = SecondsLeft(*open);
+    console.Document()["confirm"] = {{"number", open->number}, {"seconds", left}};
+    console.Warning("Change " + std::to_string(open->number) + " is undone in " +
+                    std::to_string(left) + " seconds, unless 'tslauthctl confirm' keeps it");
+}
+
 /// How the command ends by what was found beside the two files.
 ExitCode ExitCodeOf(std::vector<Finding> const& findings) {
     auto code = ExitCode::done;
@@ -190,6 +206,7 @@ ExitCode RunStatus(StatusArguments const& arguments, Console& console) {
     }
     auto const findings = FindingsOf(facts);
     Describe(findings, console);
+    DescribeConfirmation(console);
     auto const drifts = [](Agreement agreement) {
         return agreement == Agreement::partly || agreement == Agreement::notAtAll;
     };

@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "history/Confirmation.h"
 #include "history/HistoryArchive.h"
 #include "history/PathOnHost.h"
 #include "history/UndoPlan.h"
+#include "trial/LogInTrial.h"
 #include "verbs/HostChange.h"
 #include "verbs/Verbs.h"
 
@@ -89,6 +91,20 @@ std::vector<UndoStep> Planned(Snapshot const& chosen, History const& history) {
     }
 }
 
+/// Of files alone; nobody's log-in depends on the links and folders.
+PlannedTexts TextsAfter(std::vector<UndoStep> const& steps) {
+    PlannedTexts texts;
+    for (auto const& step : steps) {
+        if (step.wanted.kind == PathState::Kind::file) {
+            texts[step.path] = step.wanted.text;
+        } else if (step.wanted.kind == PathState::Kind::absent &&
+                   step.current.kind == PathState::Kind::file) {
+            texts[step.path] = std::nullopt;
+        }
+    }
+    return texts;
+}
+
 void CarryOut(std::vector<UndoStep> const& steps) {
     for (auto const& step : steps) {
         try {
@@ -97,6 +113,29 @@ void CarryOut(std::vector<UndoStep> const& steps) {
             throw Failure(ExitCode::failure, e.what());
         }
     }
+}
+
+/// What is undone needs nobody's confirmation any more.
+void ForgetUndone(unsigned number) {
+    auto const open = OpenConfirmation();
+    if (open && open->number >= number) {
+        ForgetConfirmation();
+    }
+}
+
+/// The change that is due to be undone by itself.
+std::optional<unsigned> Unconfirmed(Console& console) {
+    auto const open = OpenConfirmation();
+    if (!open) {
+        console.Line("No change waits to be confirmed.");
+        return std::nullopt;
+    }
+    if (auto const left = SecondsLeft(*open); left > 0) {
+        console.Line("Change " + std::to_string(open->number) + " waits to be confirmed for " +
+                     std::to_string(left) + " seconds more.");
+        return std::nullopt;
+    }
+    return open->number;
 }
 
 ExitCode Undo(UndoArguments const& arguments, HostChange* change, Console& console) {
@@ -116,6 +155,9 @@ ExitCode Undo(UndoArguments const& arguments, HostChange* change, Console& conso
     Describe(steps, console);
     auto const name = "change " + std::to_string(chosen.number) + " (" + chosen.command + ")";
     if (steps.empty()) {
+        if (change != nullptr) {
+            ForgetUndone(chosen.number);
+        }
         document["undone"] = true;
         console.Line("The host is as it was before " + name + "; nothing had to be changed.");
         return ExitCode::done;
@@ -130,7 +172,11 @@ ExitCode Undo(UndoArguments const& arguments, HostChange* change, Console& conso
     if (change == nullptr) {
         return ExitCode::changes;
     }
+    if (!arguments.unconfirmed) { // nobody is there to do something about it
+        LogInTrial().Require(TextsAfter(steps), console);
+    }
     change->Write("undo", PathsOf(steps), [&] { CarryOut(steps); });
+    ForgetUndone(chosen.number);
     document["undone"] = true;
     console.Line("The host is as it was before " + name + "; " +
                  base::AsciiText::Counted(steps.size(), "path") +
@@ -146,7 +192,17 @@ ExitCode RunUndo(UndoArguments const& arguments, Console& console) {
         return Undo(arguments, nullptr, console);
     }
     HostChange change(console);
-    return Undo(arguments, &change, console);
+    if (!arguments.unconfirmed) {
+        return Undo(arguments, &change, console);
+    }
+    auto due = arguments;
+    due.force = true;
+    auto const number = Unconfirmed(console);
+    if (!number) {
+        return ExitCode::done;
+    }
+    due.number = *number;
+    return Undo(due, &change, console);
 }
 
 } // namespace tessel::tslauthctl

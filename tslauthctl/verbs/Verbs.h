@@ -27,9 +27,12 @@ struct StatusArguments {
 
 ExitCode RunStatus(StatusArguments const& arguments, Console& console);
 ExitCode RunPlan(std::string const& store, Console& console);
-ExitCode RunActivate(std::string const& store, bool acceptLoss, Console& console);
+/// @param confirmWithin seconds, here and below: unless somebody confirms the change by then, it is
+///     undone; 0 for never
+ExitCode RunActivate(std::string const& store, bool acceptLoss, int confirmWithin,
+                     Console& console);
 ExitCode RunPlanSetup(std::string const& provider, Console& console);
-ExitCode RunSetup(std::string const& provider, Console& console);
+ExitCode RunSetup(std::string const& provider, int confirmWithin, Console& console);
 ExitCode RunPlanUnsetup(Console& console);
 ExitCode RunUnsetup(Console& console);
 
@@ -43,6 +46,7 @@ struct AccessArguments {
     bool trusted = false;
     /// Also names that nobody knows.
     bool force = false;
+    int confirmWithin = 0;
 };
 
 ExitCode RunPlanAccess(AccessArguments const& arguments, Limit limit, Console& console);
@@ -59,8 +63,12 @@ struct UndoArguments {
     bool dryRun = false;
     /// Also what others have edited since, and the files of a membership.
     bool force = false;
+    /// The change that nobody has confirmed in time, if there is one.
+    bool unconfirmed = false;
 };
 
+/// Keeps the change that is undone by itself otherwise.
+ExitCode RunConfirm(Console& console);
 ExitCode RunUndo(UndoArguments const& arguments, Console& console);
 
 ExitCode RunPrepare(bool write, bool acceptLoss, Console& console);
