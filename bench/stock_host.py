@@ -38,7 +38,8 @@ def log_in(host):
 
 def log_in_row(case, with_policy, without):
     more = with_policy - without
-    row(case, f"{with_policy:.1f}", f"{without:.1f}", "ms", f"{more:+.1f} ms, at most +5", more <= 5)
+    row(case, f"{with_policy:.1f}", f"{without:.1f}", "ms", f"{more:+.1f} ms, at most +5",
+        more <= 5)
 
 
 def measure_setup(host):
