@@ -22,6 +22,10 @@ constexpr char thumbprint[] = "D1:65:22:0C:77:C7:1D:60:A7:28:F0:8C:2B:C3:F8:91:C
 class ProviderCheckTest : public testing::Test {
 protected:
     void SetUp() override {
+        if (SANITIZED != 0) {
+            GTEST_SKIP() << "a sanitizer's locks are not made for forks, and what a cancelled "
+                            "thread loses it reports";
+        }
         for (char const* const path : {"/etc/tslauth-example", "/var/lib/tslauth-example"}) {
             std::filesystem::remove_all(path);
         }
@@ -39,13 +43,7 @@ protected:
     }
 
     /// Everything was looked at and nothing found, but for `skipped`.
-    static void ExpectPasses(CheckedProvider const& checked, Rules skipped) {
-        if (SANITIZED != 0) {
-            for (char const* const rule :
-                 {"released-once", "released-own", "released-all", "overrun"}) {
-                skipped.insert(rule);
-            }
-        }
+    static void ExpectPasses(CheckedProvider const& checked, Rules const& skipped) {
         EXPECT_EQ(0, checked.exitCode) << checked.tap;
         EXPECT_EQ(34U, checked.points) << checked.tap;
         EXPECT_EQ(skipped, checked.skipped) << checked.tap;
