@@ -8,8 +8,8 @@
 #include "faults/Faults.h"
 
 #include <cerrno>
-#include <filesystem>
 #include <fcntl.h>
+#include <filesystem>
 #include <gmock/gmock.h>
 #include <map>
 #include <stdexcept>
