@@ -190,6 +190,8 @@ private:
     static CURLcode Prepare(CURL*, void* context, void* session) noexcept {
         auto* const tls = static_cast<SSL_CTX*>(context);
         SSL_CTX_set_options(tls, SSL_OP_CLEANSE_PLAINTEXT | SSL_OP_NO_RENEGOTIATION);
+        // libcurl writes the keys of its connections to a file that the environment may name.
+        SSL_CTX_set_keylog_callback(tls, nullptr);
         // Also where libcurl is not to verify: the pin is held against the certificate there.
         SSL_CTX_set_verify(tls, SSL_VERIFY_PEER, nullptr);
         SSL_CTX_set_cert_verify_callback(tls, &Session::Judge, session);

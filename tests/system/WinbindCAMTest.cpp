@@ -10,6 +10,7 @@
 #include <arpa/inet.h>
 #include <chrono>
 #include <csignal>
+#include <cstdlib>
 #include <dlfcn.h>
 #include <filesystem>
 #include <functional>
@@ -699,6 +700,15 @@ TEST_F(WinbindCAMTest, ThreadsOfAProcessMayAskAtOnce) {
     for (std::thread& thread : threads) {
         thread.join();
     }
+}
+
+TEST_F(WinbindCAMTest, NoFileOfTheEnvironmentGetsTheKeysOfAConnection) {
+    auto const service = Serve();
+    std::string const file = StandIn + "/keys";
+    setenv("SSLKEYLOGFILE", file.c_str(), 1);
+    EXPECT_EQ("corp.example", Pinned().GetDNSDomainName());
+    unsetenv("SSLKEYLOGFILE");
+    EXPECT_TRUE(!fs::exists(file) || fs::file_size(file) == 0);
 }
 
 TEST_F(WinbindCAMTest, WhoSaysNothingGivesItsPlaceToWhoAsks) {
