@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """The command line."""
 import argparse
+import contextlib
 import json
 import os
 import pwd
@@ -169,7 +170,8 @@ class Lists:
 
     def withdraw(self, path):
         self._output.close()
-        os.unlink(path)
+        with contextlib.suppress(OSError):  # the operator's folder is not the service's user's
+            os.unlink(path)
 
 
 def issue_codes(store, options, who):

@@ -823,6 +823,15 @@ class Commands(unittest.TestCase):
         self.assertEqual([mock.call.setgroups([]), mock.call.setresgid(8, 8, 8),
                           mock.call.setresuid(7, 7, 7)], calls.mock_calls)
 
+    def test_why_nothing_was_issued_is_told_also_where_the_output_stays(self):
+        lists = object.__new__(commands.Lists)
+        lists.wanted, lists._output = [], io.StringIO()
+        kept = mock.Mock()
+        kept.issue_all.side_effect = store.NoStore("away")
+        with mock.patch.object(commands.os, "unlink", side_effect=PermissionError), \
+                self.assertRaisesRegex(store.NoStore, "away"):
+            commands.issue_codes(kept, mock.Mock(lists=lists, output="codes.csv"), "somebody")
+
     def test_the_program_says_what_the_stdout_has_no_letters_for(self):
         with tempfile.TemporaryDirectory() as folder:
             file = pathlib.Path(folder) / "service.toml"
