@@ -155,8 +155,7 @@ bool HostChange::Conclude(Snapshot snapshot) {
 
 void RequireRoot(char const* what) {
     if (geteuid() != 0) {
-        throw Failure(ExitCode::notRoot, std::string(what) + " changes the host and must be run "
-                                                             "as root");
+        throw Failure(ExitCode::notRoot, std::string(what) + " must be run as root");
     }
 }
 
