@@ -81,15 +81,20 @@ void StartProcess(std::int64_t until) {
     pid_t const child = fork();
     if (child == 0) {
         // Its own session, and nobody's child.
-        if (setsid() < 0 || fork() != 0) {
-            _exit(0);
+        pid_t const waiting = setsid() < 0 ? -1 : fork();
+        if (waiting != 0) {
+            _exit(waiting < 0 ? 1 : 0);
         }
         UndoLater(program.c_str(), until);
     }
     if (child < 0) {
         throw Failure(ExitCode::failure, "Cannot start a process: " + base::SystemText(errno));
     }
-    while (waitpid(child, nullptr, 0) < 0 && errno == EINTR) {
+    int status = 0;
+    while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
+    }
+    if (status != 0) {
+        throw Failure(ExitCode::failure, "Cannot start a process that would undo the change");
     }
 }
 
