@@ -44,8 +44,9 @@ readonly service_packages=(
     python3-psycopg2 python3-sqlalchemy util-linux
 )
 
-# What several CAM services work with, and the browser that looks at their page.
-readonly fleet_packages=(chromium haproxy postgresql)
+# What several CAM services work with, the browser that looks at their page, and what judges their
+# unit.
+readonly fleet_packages=(chromium haproxy postgresql systemd)
 
 # What the tests need beyond those.
 readonly test_packages=(
