@@ -711,6 +711,19 @@ TEST_F(WinbindCAMTest, NoFileOfTheEnvironmentGetsTheKeysOfAConnection) {
     EXPECT_TRUE(!fs::exists(file) || fs::file_size(file) == 0);
 }
 
+TEST_F(WinbindCAMTest, NoProxyOfTheEnvironmentIsUsed) {
+    auto const service = Serve();
+    setenv("https_proxy", "http://127.0.0.1:1", 1);
+    EXPECT_EQ("corp.example", Pinned().GetDNSDomainName());
+    unsetenv("https_proxy");
+}
+
+TEST_F(WinbindCAMTest, NobodyIsFollowedToAnotherServer) {
+    auto const server = ServeFault("raw:HTTP/1.1 302 Found\\r\\nLocation: https://127.0.0.1:1/"
+                                   "\\r\\nContent-Length: 2\\r\\n\\r\\n{}");
+    EXPECT_THAT(NameFailure(Pinned()), IsUnknown(13));
+}
+
 TEST_F(WinbindCAMTest, WhoSaysNothingGivesItsPlaceToWhoAsks) {
     auto const service = Serve("good", "[limits]\nconnections_of_an_address = 8\n");
     std::vector<int> sockets;
