@@ -213,7 +213,8 @@ fn write(path: &str, text: &[u8], first: bool) -> Answer<()> {
     let result = (|| {
         fs::DirBuilder::new().recursive(true).mode(0o755).create(STATE)?;
         let mut options = fs::OpenOptions::new();
-        let mut file = options.write(true).create(true).truncate(true).mode(0o644).open(&temporary)?;
+        options.write(true).create(true).truncate(true).mode(0o644);
+        let mut file = options.open(&temporary)?;
         file.write_all(text)?;
         file.sync_all()?;
         if first {
@@ -312,7 +313,10 @@ unsafe extern "C" fn part_domain(by: *const Credentials) -> c_int {
     })
 }
 
-unsafe extern "C" fn get_active_domain(domain: *mut Domain, release: *mut Option<Release>) -> c_int {
+unsafe extern "C" fn get_active_domain(
+    domain: *mut Domain,
+    release: *mut Option<Release>,
+) -> c_int {
     entry(|| {
         if !is_joined() {
             return Ok(()); // both names stay null: there is no active domain
