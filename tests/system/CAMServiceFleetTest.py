@@ -11,7 +11,7 @@ import time
 import unittest
 
 sys.path.insert(0, str(pathlib.Path(__file__).parent))
-from camfleet import BALANCER, NODES, Fleet, ask, join, receive  # pylint: disable=C0413
+from camfleet import BALANCER, NODES, Fleet, ask, insist, join, receive  # pylint: disable=C0413
 
 POINTS = ("before-claim", "claimed", "made-by-net", "made", "answered")
 
@@ -55,7 +55,8 @@ class FleetTest(unittest.TestCase):
             # From many addresses: one alone would not be heard after five wrong codes.
             async def one(number):
                 async with self.fleet.session(f"127.1.{number // 4}.1") as session:
-                    return await ask(session, NODES[number % 3], "many", code, str(number))
+                    return await insist(session, NODES[number % 3], "many", code,
+                                        str(number))
             return await asyncio.gather(*map(one, range(200)))
         answers = asyncio.run(storm())
         statuses = sorted(status for status, _ in answers)
@@ -68,7 +69,7 @@ class FleetTest(unittest.TestCase):
         async def storm():
             async def one(number):
                 async with self.fleet.session(f"127.2.{number // 4}.1") as session:
-                    return await ask(session, BALANCER, "balanced", code, str(number))
+                    return await insist(session, BALANCER, "balanced", code, str(number))
             return await asyncio.gather(*map(one, range(200)))
         statuses = sorted(status for status, _ in asyncio.run(storm()))
         self.assertEqual([201] + [403] * 199, statuses)

@@ -219,6 +219,15 @@ async def ask(session, server, host, code, key):
         return None, repr(error)
 
 
+async def insist(session, server, host, code, key):
+    """As `ask`, and again where no answer came: a busy machine gives connections up."""
+    for _ in range(10):
+        answer = await ask(session, server, host, code, key)
+        if answer[0] is not None:
+            break
+    return answer
+
+
 async def receive(session, server, claim):
     try:
         async with session.post(f"https://{server}:8989/v1/accounts/received",

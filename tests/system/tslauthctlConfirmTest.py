@@ -92,6 +92,14 @@ class Confirm(unittest.TestCase):
         self.assertNotIn("confirm", document)
         self.assertFalse(OPEN.exists())
 
+    def test_what_cannot_be_read_is_in_nobodys_way_for_ever(self):
+        OPEN.parent.mkdir(parents=True, exist_ok=True)
+        OPEN.write_text("{")
+        self.assertEqual(FAILURE, ask("activate", AD)["exit"])
+        self.assertEqual(FAILURE, ask("confirm")["exit"])
+        self.assertEqual(REFUSED, ask("confirm")["exit"])
+        self.assertEqual(DONE, ask("activate", AD)["exit"])
+
     def test_seconds_are_some(self):
         for seconds in ("0", "-1", "x", "86401"):
             self.assertEqual(USAGE, ask("activate", AD, "--confirm-within", seconds)["exit"])

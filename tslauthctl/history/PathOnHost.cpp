@@ -3,6 +3,7 @@
 
 #include "setup/SetupHost.h"
 
+#include <base/AsciiText.h>
 #include <base/Descriptor.h>
 #include <base/FileError.h>
 
@@ -79,8 +80,14 @@ void MakeFoldersAbove(std::string const& path) {
 }
 
 void PutFolder(std::string const& path, PathState const& wanted) {
-    if (::mkdir(path.c_str(), 0700) != 0 && errno != EEXIST) {
-        throw base::FileError("make", path, errno);
+    if (::mkdir(path.c_str(), 0700) != 0) {
+        struct stat status = {};
+        if (errno != EEXIST || ::lstat(path.c_str(), &status) != 0) {
+            throw base::FileError("make", path, errno);
+        }
+        if (!S_ISDIR(status.st_mode)) {
+            throw base::FileError("make", path, ENOTDIR);
+        }
     }
     if (::chown(path.c_str(), wanted.attributes.owner, wanted.attributes.group) != 0 ||
         ::chmod(path.c_str(), wanted.attributes.mode) != 0) {
@@ -116,9 +123,12 @@ PathStates StatesOnHost(std::vector<std::string> const& paths) {
     for (auto const& path : paths) {
         auto const& state = states[path] = StateOnHost(path);
         if (state.kind == Kind::link) {
-            // What writes the file follows the link.
+            // What writes the file follows the link. What lies elsewhere, such as the resolver's
+            // own file below /run, is written anew by whose it is.
             auto const destination = base::Destination(path);
-            states[destination] = StateOnHost(destination);
+            if (base::AsciiText::StartsWith(destination, "/etc/")) {
+                states[destination] = StateOnHost(destination);
+            }
         } else if (state.kind == Kind::absent) {
             for (auto& folder : MissingFolders(path)) {
                 states[std::move(folder)] = {};

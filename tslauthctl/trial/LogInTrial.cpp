@@ -37,6 +37,7 @@ namespace {
 /// Those through which people come in.
 constexpr char const* services[] = {"login", "sshd", "su", "sudo"};
 
+/// With each answer: a busy host takes long for all of them, and a module that hangs for one.
 constexpr std::chrono::seconds patience(10);
 
 constexpr char cannotBeTried[] = "cannot be tried";
@@ -146,9 +147,9 @@ bool EnterPrivateView() {
     _exit(0);
 }
 
-/// What comes until the other end is closed, or too much time has passed.
+/// What comes until the other end is closed, or keeps silent for too long.
 std::string ReadAnswers(int input) {
-    auto const deadline = std::chrono::steady_clock::now() + patience;
+    auto deadline = std::chrono::steady_clock::now() + patience;
     std::string text;
     for (;;) {
         auto const left = std::chrono::duration_cast<std::chrono::milliseconds>(
@@ -164,6 +165,7 @@ std::string ReadAnswers(int input) {
             return text;
         }
         text.append(buffer, static_cast<std::size_t>(count));
+        deadline = std::chrono::steady_clock::now() + patience;
     }
 }
 

@@ -5,10 +5,26 @@
 
 namespace tessel::tslauthctl {
 
+namespace {
+
+/// @throws Failure where what is written of it makes no sense; it is forgotten then, since no
+///         change would be possible otherwise
+std::optional<Confirmation> OpenOrForgotten() {
+    try {
+        return OpenConfirmation();
+    } catch (Failure const& e) {
+        ForgetConfirmation();
+        throw Failure(ExitCode::failure,
+                      std::string(e.what()) + "; it is removed, and what was changed stays");
+    }
+}
+
+} // namespace
+
 ExitCode RunConfirm(Console& console) {
     RequireRoot("confirm");
     HostChange const change(console);
-    auto const open = OpenConfirmation();
+    auto const open = OpenOrForgotten();
     if (!open) {
         throw Failure(ExitCode::refused, "No change waits to be confirmed");
     }

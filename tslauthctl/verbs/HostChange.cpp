@@ -72,7 +72,7 @@ void HostChange::Write(std::string const& verb, std::vector<std::string> const& 
         PutBack(snapshot);
         (void)Conclude(snapshot);
         if (_confirmWithin > 0) {
-            ForgetConfirmation();
+            ForgetOpenConfirmation();
         }
         throw;
     }
@@ -81,6 +81,15 @@ void HostChange::Write(std::string const& verb, std::vector<std::string> const& 
         TellConfirmation(snapshot);
     } else if (_confirmWithin > 0) {
         ForgetConfirmation();
+    }
+}
+
+void HostChange::ForgetOpenConfirmation() {
+    try {
+        ForgetConfirmation();
+    } catch (std::exception const& e) {
+        // Why the change failed counts for more.
+        _console.ErrorDetail(std::string(e.what()) + "; 'tslauthctl confirm' takes it away");
     }
 }
 

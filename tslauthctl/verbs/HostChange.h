@@ -48,6 +48,7 @@ private:
 
     void RequireNothingOpen(std::string const& verb) const;
     void TellConfirmation(Snapshot const& snapshot);
+    void ForgetOpenConfirmation();
 
     int _confirmWithin = 0;
     Console& _console;

@@ -10,6 +10,7 @@
 
 #include <base/AsciiText.h>
 #include <sstream>
+#include <unistd.h>
 
 namespace tessel::tslauthctl {
 
@@ -203,6 +204,10 @@ std::shared_ptr<Secret> AskForPassword(JoinArguments const& arguments) {
 std::string Preview(JoinArguments const& arguments, std::string const& domain,
                     std::shared_ptr<ActiveDirectoryStore> const& store, Limit limit,
                     Console& console) {
+    if (geteuid() != 0) {
+        console.Warning("what is in the way of a join is told to root alone");
+        return {};
+    }
     auto const password = arguments.account.user ? AskForPassword(arguments) : nullptr;
     auto const account = password ? Account::given : Account::none;
     return Explaining(account, [&] {
@@ -233,7 +238,7 @@ void TellFindings(std::string const& findings, Console& console) {
             found[line.substr(0, colon)] = line.substr(colon + 2);
         }
     }
-    if (findings.empty()) {
+    if (findings.empty() && geteuid() == 0) {
         console.Note("The provider does not look at the clock, the unit and the account before it "
                      "joins.");
     }
