@@ -42,7 +42,7 @@ struct PathState {
 using PathStates = std::map<std::string, PathState>;
 
 struct Snapshot {
-    /// Counts up from 1, and is used once.
+    /// Counts up from 1; that of a change which changed nothing is given again.
     unsigned number = 0;
     /// In UTC, as "2026-11-22T01:30:00Z".
     std::string when;

@@ -101,7 +101,8 @@ enum {
 };
 
 /* Makes `store` the host's: looks at a plan made anew under the lock, refuses where it would fail
- * or lose something, and carries it out.
+ * or lose something, and carries it out. Unlike tslauthctl(8) it keeps nothing for an undo, and
+ * does not look whether a change of the tool's waits to be confirmed, which is undone then.
  * `seconds`: to wait for the lock. */
 TSLAUTH_C_EXPORT int tslauth_activate(char const* store, unsigned flags, int seconds,
                                       tslauth_error** error);
