@@ -14,10 +14,11 @@ TITLE = "Joins that fail, and leave the host as it was"
 FOLDERS = ("/etc", "/var/lib/samba", "/var/cache/samba", "/var/log/samba", "/run", "/usr/libexec",
            "/tmp", "/home")
 # Locks may outlive those who took them. The log is this scenario's own, see SystemLog.
-EXEMPT = {"/run/tslauthctl.lock", "/run/tslauth-winbind.lock", "/run/system.log"}
+EXEMPT = {"/run/tslauthctl.lock", "/run/tslauth-winbind.lock", "/run/system.log",
+          "/run/node/var/lib/tslauth"}
 
-# What the kernel keeps for the overlays of a node.
-OVERLAYS = ("/run/node/usr.work", "/run/node/var.work")
+# What the kernel keeps for the overlays of a node, and tslauthctl of its changes.
+KEPT = ("/run/node/usr.work", "/run/node/var.work", "/run/node/var/lib/tslauth/history")
 
 # Exit codes of tslauthctl.
 DONE, REFUSED, UNREACHABLE, CREDENTIALS = 0, 4, 8, 9
@@ -115,7 +116,7 @@ def compare(host, before):
     """What differs by now, but for what is exempt; and which processes are new."""
     files, running = before
     changes = {path: kind for path, kind in differences(files, host.snapshot(*FOLDERS)).items()
-               if path not in EXEMPT and not path.startswith(OVERLAYS)}
+               if path not in EXEMPT and not path.startswith(KEPT)}
     return changes, sorted(processes(host) - running)
 
 

@@ -30,11 +30,13 @@ ACTIVATION = {
     "/etc/nsswitch.conf": "changed",
     "/etc/tessel/tslauth/authentication.conf": "changed",
     # What tslauthctl has put into the files, so that it can take that out again.
-    "/var/lib/tslauth": "new",
     "/var/lib/tslauth/inserted": "new",
 }
+# What tslauthctl remembers of its changes.
+HISTORY = "/var/lib/tslauth/history"
 # The entry of the management address stays in /etc/hosts.
 KEPT_BY_US = {
+    "/var/lib/tslauth": "new",
     "/etc/hosts": "changed",
     "/run/tslauthctl.lock": "new",
 }
@@ -79,6 +81,8 @@ def snapshot(host):
             path = path[len("/run/node"):]
             if not path.startswith(("/usr/", "/var/")):
                 continue
+        if path.startswith(HISTORY):
+            continue
         found[path] = state
     return found
 
