@@ -76,6 +76,7 @@ void TellEdits(std::vector<UndoStep> const& steps, Console& console) {
 
 std::vector<std::string> PathsOf(std::vector<UndoStep> const& steps) {
     std::vector<std::string> paths;
+    paths.reserve(steps.size());
     for (auto const& step : steps) {
         paths.push_back(step.path);
     }
