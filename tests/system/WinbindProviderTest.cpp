@@ -42,6 +42,19 @@ extern "C" char const* __lsan_default_suppressions() {
 
 namespace {
 
+/// Of a process that ends beside a thread that hangs: what that thread holds is no leak, and the
+/// leak checker sometimes cannot stop it to see so.
+bool endsBesideAThread = false;
+
+} // namespace
+
+/// Asked by the leak checker, where there is one (sanitizer/lsan_interface.h).
+extern "C" int __lsan_is_turned_off() {
+    return endsBesideAThread ? 1 : 0;
+}
+
+namespace {
+
 typedef std::chrono::steady_clock Clock;
 
 constexpr char socketFolder[] = "/run/samba/winbindd";
@@ -211,6 +224,7 @@ TEST_F(WinbindProviderTest, AProgramEndsWhileAQuestionHangs) {
     pid_t const child = fork();
     ASSERT_NE(-1, child);
     if (child == 0) {
+        endsBesideAThread = true;
         ActiveDirectoryProvider const provider("winbind");
         exit(provider.GetDomainTrustState());
     }
